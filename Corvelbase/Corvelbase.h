@@ -1,0 +1,10 @@
+// Umbrella header: everything a host needs.
+#pragma once
+
+#include "Corvelbase/platform/Error.h"
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/Geometry.h"
+#include "Corvelbase/platform/Log.h"
+#include "Corvelbase/platform/Platform.h"
+#include "Corvelbase/platform/PropertyList.h"
+#include "Corvelbase/platform/String.h"

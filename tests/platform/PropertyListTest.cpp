@@ -1,0 +1,131 @@
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <filesystem>
+
+#include "Corvelbase/platform/Error.h"
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/Log.h"
+#include "Corvelbase/platform/Platform.h"
+#include "Corvelbase/platform/PropertyList.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+PropertyList sampleTree() {
+  PropertyList::Dictionary child{{"text", u"caf\u00e9 \U0001F600"},
+                                 {"confidence", 0.25},
+                                 {"level", std::uint64_t{2}},
+                                 {"childBlocks", PropertyList::Array{}}};
+  return PropertyList::Dictionary{
+      {"text", u"column"},
+      {"flag", true},
+      {"bytes", Data{0, 1, 2, 255}},
+      {"uid", PropertyList::Uid{7}},
+      {"childBlocks", PropertyList::Array{child, child}},
+  };
+}
+
+TEST(PropertyList, RoundTripsThroughBinaryAndXML) {
+  PropertyList tree = sampleTree();
+  auto binary = tree.serialize(PropertyList::Format::Binary);
+  ASSERT_TRUE(binary);
+  EXPECT_EQ(std::string(binary->begin(), binary->begin() + 8), "bplist00");
+  EXPECT_EQ(PropertyList::deserialize(*binary), tree);
+
+  PropertyList noUid = tree;
+  noUid.dictionary()->erase("uid");
+  auto xml = noUid.serialize(PropertyList::Format::XML);
+  ASSERT_TRUE(xml);
+  EXPECT_NE(std::string(xml->begin(), xml->end()).find("<plist"), std::string::npos);
+  EXPECT_EQ(PropertyList::deserialize(*xml), noUid);
+}
+
+TEST(PropertyList, RejectsWhatIsNoPropertyList) {
+  EXPECT_FALSE(PropertyList::deserialize(Data{}));
+  std::string junk = "not a plist at all";
+  EXPECT_FALSE(PropertyList::deserialize(Data(junk.begin(), junk.end())));
+  auto binary = sampleTree().serialize(PropertyList::Format::Binary);
+  for (std::size_t cut : {std::size_t{8}, binary->size() / 2, binary->size() - 1}) {
+    Data truncated(binary->begin(), binary->begin() + static_cast<long>(cut));
+    EXPECT_FALSE(PropertyList::deserialize(truncated)) << "cut at " << cut;
+  }
+  EXPECT_FALSE(PropertyList().serialize(PropertyList::Format::XML));
+}
+
+TEST(PropertyList, NumberConversionsFollowThePlatformsNumbers) {
+  EXPECT_EQ(PropertyList(0.1).floatValue(), 0.1f);
+  EXPECT_EQ(PropertyList(std::uint64_t{5000000000}).unsignedIntValue(), 705032704u);
+  EXPECT_EQ(PropertyList(u"12.5abc").doubleValue(), 12.5);
+  EXPECT_EQ(PropertyList(Data{1}).doubleValue(), 0);
+  EXPECT_EQ(PropertyList(std::numeric_limits<double>::quiet_NaN()).unsignedIntValue(), 0u);
+  EXPECT_EQ(PropertyList(1e300).unsignedIntegerValue(), UINT64_MAX);
+  EXPECT_EQ(PropertyList(std::int64_t{-3}).integerValue(), -3);
+}
+
+TEST(PropertyList, FilesAreWrittenWholeAndReadBack) {
+  testing::TempDir dir;
+  std::string path = dir.file("tree.plist");
+  ASSERT_TRUE(sampleTree().writeToFile(path, PropertyList::Format::Binary));
+  EXPECT_EQ(PropertyList::readFromFile(path), sampleTree());
+  EXPECT_FALSE(PropertyList::readFromFile(dir.file("missing.plist")));
+  // A failed write leaves the previous file in place and no temporary behind.
+  EXPECT_FALSE(PropertyList().writeToFile(path, PropertyList::Format::Binary));
+  EXPECT_EQ(PropertyList::readFromFile(path), sampleTree());
+  EXPECT_FALSE(writeFileAtomically(dir.file("no/such/dir/file"), Data{1}));
+  EXPECT_EQ(std::distance(std::filesystem::directory_iterator(dir.path()), {}), 1);
+}
+
+TEST(Files, CachesDirectoryFollowsTheEnvironmentAndIsCreated) {
+  testing::TempDir dir;
+  std::string xdg = dir.file("xdg");
+  setenv("XDG_CACHE_HOME", xdg.c_str(), 1);
+  EXPECT_EQ(cachesDirectory(), xdg);
+  EXPECT_TRUE(std::filesystem::is_directory(xdg));
+  setenv("XDG_CACHE_HOME", "relative/path", 1);
+  std::string home = dir.file("home");
+  setenv("HOME", home.c_str(), 1);
+  EXPECT_EQ(cachesDirectory(), home + "/.cache");
+  PlatformRegistry::setCachesDirectory(dir.file("override"));
+  EXPECT_EQ(cachesDirectory(), dir.file("override"));
+  PlatformRegistry::setCachesDirectory(std::nullopt);
+  unsetenv("XDG_CACHE_HOME");
+}
+
+TEST(Files, UUIDsAreCanonicalUpperCaseAndDistinct) {
+  std::string a = makeUUIDString(), b = makeUUIDString();
+  EXPECT_NE(a, b);
+  ASSERT_EQ(a.size(), 36u);
+  for (std::size_t i = 0; i < a.size(); ++i) {
+    if (i == 8 || i == 13 || i == 18 || i == 23) {
+      EXPECT_EQ(a[i], '-');
+    } else {
+      EXPECT_TRUE(std::isdigit(a[i]) || (a[i] >= 'A' && a[i] <= 'F')) << a;
+    }
+  }
+}
+
+TEST(Strings, ConversionsReplaceWhatIsNotUnicode) {
+  EXPECT_EQ(toUTF8(u"a\U0001F600b"),
+            "a\xF0\x9F\x98\x80"
+            "b");
+  EXPECT_EQ(toUTF8(String{u'x', 0xD800, u'y'}), "x\xEF\xBF\xBDy");
+  EXPECT_EQ(fromUTF8("a\xFF"
+                     "b"),
+            (String{u'a', 0xFFFD, u'b'}));
+  EXPECT_EQ(fromUTF8("\xF0\x9F\x98\x80"), u"\U0001F600");
+}
+
+TEST(ErrorAndLog, DescriptionAndSink) {
+  Error error{"com.example", 200, {{"Error reason", u"broken"}}};
+  EXPECT_EQ(error.description(),
+            "Error Domain=com.example Code=200 \"(null)\" UserInfo={Error reason=broken}");
+  EXPECT_EQ(error.userInfoString("Error reason"), "broken");
+  testing::LogCapture capture;
+  logMessage("Error: something");
+  EXPECT_EQ(capture.lines(), std::vector<std::string>{"Error: something"});
+}
+
+}  // namespace
+}  // namespace corvel

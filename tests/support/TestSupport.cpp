@@ -1,0 +1,55 @@
+#include "support/TestSupport.h"
+
+#include <sys/wait.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+
+#include "Corvelbase/platform/Platform.h"
+
+namespace corvel::testing {
+
+LogCapture::LogCapture() {
+  PlatformRegistry::setLogSink([this](std::string_view line) {
+    std::lock_guard lock(mutex_);
+    lines_.emplace_back(line);
+  });
+}
+
+LogCapture::~LogCapture() { PlatformRegistry::setLogSink(nullptr); }
+
+std::vector<std::string> LogCapture::lines() const {
+  std::lock_guard lock(mutex_);
+  return lines_;
+}
+
+TempDir::TempDir() {
+  std::filesystem::create_directories(CORVEL_TEST_WORK_DIR);
+  std::string pattern = std::string(CORVEL_TEST_WORK_DIR) + "/tmp.XXXXXX";
+  if (!mkdtemp(pattern.data())) std::abort();
+  path_ = pattern;
+}
+
+TempDir::~TempDir() {
+  std::error_code ec;
+  std::filesystem::remove_all(path_, ec);
+}
+
+std::string fixturePath(const std::string& relative) {
+  return std::string(CORVEL_FIXTURES_DIR) + "/" + relative;
+}
+
+CommandResult runCommand(const std::string& command) {
+  CommandResult result;
+  FILE* pipe = popen(command.c_str(), "r");
+  if (!pipe) return result;
+  char buffer[4096];
+  std::size_t n;
+  while ((n = fread(buffer, 1, sizeof buffer, pipe)) > 0) result.output.append(buffer, n);
+  int status = pclose(pipe);
+  result.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  return result;
+}
+
+}  // namespace corvel::testing

@@ -1,0 +1,52 @@
+// Small helpers shared by the test suites.
+#pragma once
+
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "Corvelbase/platform/String.h"
+
+namespace corvel::testing {
+
+// Captures the library's log lines for as long as it lives.
+class LogCapture {
+ public:
+  LogCapture();
+  ~LogCapture();
+  LogCapture(const LogCapture&) = delete;
+  LogCapture& operator=(const LogCapture&) = delete;
+
+  std::vector<std::string> lines() const;
+
+ private:
+  mutable std::mutex mutex_;
+  std::vector<std::string> lines_;
+};
+
+// A fresh empty directory under the build's test work folder, removed on destruction.
+class TempDir {
+ public:
+  TempDir();
+  ~TempDir();
+  TempDir(const TempDir&) = delete;
+  TempDir& operator=(const TempDir&) = delete;
+
+  const std::string& path() const { return path_; }
+  std::string file(const std::string& name) const { return path_ + "/" + name; }
+
+ private:
+  std::string path_;
+};
+
+// Path of a committed fixture: tests/fixtures/<relative>.
+std::string fixturePath(const std::string& relative);
+
+// Runs a shell command, returning its exit status and standard output.
+struct CommandResult {
+  int status = -1;
+  std::string output;
+};
+CommandResult runCommand(const std::string& command);
+
+}  // namespace corvel::testing
