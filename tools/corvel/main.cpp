@@ -1,6 +1,6 @@
 // corvel: the library's jobs on the command line.
-#include <cstring>
 #include <iostream>
+#include <map>
 
 #include "Commands.h"
 
@@ -8,19 +8,26 @@ namespace corvel::tool {
 
 namespace {
 
-// One row per subcommand, in the order `corvel --help` lists them.
-const Command kCommands[] = {
-    {nullptr, nullptr, nullptr},
+struct Command {
+  const char* usage;
+  CommandFunction run;
 };
+
+std::map<std::string, Command>& commands() {
+  static std::map<std::string, Command> table;
+  return table;
+}
 
 void printUsage(std::ostream& out) {
   out << "usage: corvel COMMAND [ARGS...]\n\ncommands:\n";
-  for (const auto& command : kCommands) {
-    if (command.name) out << "  " << command.usage << '\n';
-  }
+  for (const auto& [name, command] : commands()) out << "  " << command.usage << '\n';
 }
 
 }  // namespace
+
+CommandRegistration::CommandRegistration(const char* name, const char* usage, CommandFunction run) {
+  commands()[name] = Command{usage, run};
+}
 
 int misuse(const std::string& message) {
   std::cerr << "corvel: " << message << '\n';
@@ -28,17 +35,17 @@ int misuse(const std::string& message) {
 }
 
 int main(int argc, char** argv) {
-  if (argc < 2 || !std::strcmp(argv[1], "--help") || !std::strcmp(argv[1], "-h")) {
+  std::string first = argc < 2 ? "" : argv[1];
+  if (argc < 2 || first == "--help" || first == "-h") {
     printUsage(argc < 2 ? std::cerr : std::cout);
     return argc < 2 ? 2 : 0;
   }
-  for (const auto& command : kCommands) {
-    if (command.name && !std::strcmp(argv[1], command.name)) {
-      return command.run(Arguments(argv + 2, argv + argc));
-    }
+  auto it = commands().find(first);
+  if (it == commands().end()) {
+    printUsage(std::cerr);
+    return misuse("unknown command '" + first + "'");
   }
-  printUsage(std::cerr);
-  return misuse(std::string("unknown command '") + argv[1] + "'");
+  return it->second.run(Arguments(argv + 2, argv + argc));
 }
 
 }  // namespace corvel::tool
