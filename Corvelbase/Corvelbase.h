@@ -1,6 +1,9 @@
 // Umbrella header: everything a host needs.
 #pragma once
 
+#include "Corvelbase/RVRecognitionBlock.h"
+#include "Corvelbase/RVTextLayoutAnalyser.h"
+#include "Corvelbase/platform/CJK.h"
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Geometry.h"

@@ -1,0 +1,210 @@
+// Block assembly: adding members to containers, cutting paragraphs, and the texts, words
+// and writing direction of a block.
+#include <algorithm>
+
+#include "Corvelbase/RVRecognitionBlock.h"
+#include "Corvelbase/platform/CJK.h"
+
+namespace corvel {
+
+namespace {
+
+constexpr std::size_t kWordCapacity = 100;
+constexpr std::size_t kChildCapacity = 10;
+
+// The whitespace-and-newline set that words are split at.
+bool isWhitespaceOrNewline(char16_t u) {
+  return u == 0x0009 || u == 0x0020 || u == 0x00A0 || u == 0x1680 || (u >= 0x2000 && u <= 0x200B) ||
+         u == 0x202F || u == 0x205F || u == 0x3000 || (u >= 0x000A && u <= 0x000D) || u == 0x0085 ||
+         u == 0x2028 || u == 0x2029;
+}
+
+std::vector<String> splitAtWhitespace(const String& text) {
+  std::vector<String> pieces;
+  String piece;
+  for (char16_t unit : text) {
+    if (isWhitespaceOrNewline(unit)) {
+      pieces.push_back(std::move(piece));
+      piece.clear();
+    } else {
+      piece.push_back(unit);
+    }
+  }
+  pieces.push_back(std::move(piece));
+  return pieces;
+}
+
+// "%@" of a possibly nil string.
+String formatted(const std::optional<String>& text) { return text ? *text : u"(null)"; }
+
+}  // namespace
+
+bool RVRecognitionBlock::containsChild(const std::shared_ptr<RVRecognitionBlock>& block) const {
+  return std::any_of(childBlocks_->begin(), childBlocks_->end(),
+                     [&](const auto& child) { return child && child->isEqual(block); });
+}
+
+void RVRecognitionBlock::rebuildText() { text_ = buildTextString(); }
+
+void RVRecognitionBlock::addChildBlock(const std::shared_ptr<RVRecognitionBlock>& block,
+                                       RVBlockMatchType continuous) {
+  if (!block) return;
+  block->matchType_ = continuous;
+  if (containsChild(block)) return;
+  double bottom = rectGetMinY(block->boundingBox_);
+  auto below = std::find_if(childBlocks_->begin(), childBlocks_->end(), [&](const auto& child) {
+    return child && rectGetMinY(child->boundingBox_) < bottom;
+  });
+  childBlocks_->insert(below, block);
+  boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+  rebuildText();
+}
+
+void RVRecognitionBlock::insertBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
+  if (!block || containsChild(block)) return;
+  bool placed = false;
+  for (std::size_t i = 0; i < childBlocks_->size() && !placed; ++i) {
+    std::shared_ptr<RVRecognitionBlock> child = (*childBlocks_)[i];
+    if (!child) continue;
+    if (isBlockOnSameLine(block, child)) {
+      if (isBlockOnAfterBlock(block, child)) {
+        child->appendBlock(block);
+      } else {
+        child->prependBlock(block);
+      }
+      placed = true;
+    } else if (isBlockAboveBlock(block, child)) {
+      childBlocks_->insert(childBlocks_->begin() + static_cast<std::ptrdiff_t>(i), block);
+      placed = true;
+    }
+  }
+  // Only a block that went to the end grows the column's box: a merged or inserted block
+  // leaves it as it was, which stored analyses depend on.
+  if (!placed) {
+    childBlocks_->push_back(block);
+    boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+  }
+  rebuildText();
+}
+
+void RVRecognitionBlock::appendBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
+  if (!block) return;
+  text_ = formatted(text_) + u" " + formatted(block->text_);
+  boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+}
+
+void RVRecognitionBlock::prependBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
+  if (!block) return;
+  text_ = formatted(block->text_) + u" " + formatted(text_);
+  boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+}
+
+void RVRecognitionBlock::buildParagraphs() {
+  auto result = std::make_shared<RVBlockArray>();
+  result->reserve(kChildCapacity);
+  for (const auto& child : *childBlocks_) {
+    if (child && child->level_ == RVRecognitionBlockLevelParagraph) result->push_back(child);
+  }
+  std::shared_ptr<RVRecognitionBlock> previous, paragraph;
+  double spacing = 0;
+  std::uint64_t count = 0;
+  // Walk a snapshot: a host may have made this block one of its own children.
+  const RVBlockArray children = *childBlocks_;
+  for (const auto& child : children) {
+    if (!child) continue;
+    if (!paragraph) {
+      paragraph = initParagraphWithBlock(child);
+      result->push_back(paragraph);
+      spacing = 0;
+      count = 0;
+    } else {
+      double gap = rectGetMinY(previous->boundingBox_) - rectGetMaxY(child->boundingBox_);
+      previous->lineSpacing_ = gap;
+      if (gap < maxLineSeperation) {
+        paragraph->addChildBlock(child, RVBlockMatchSameColumn);
+        ++count;
+        // A running value kept as it has always been computed, not a true mean.
+        spacing = (spacing + gap) / static_cast<double>(count);
+      } else {
+        paragraph->lineSpacing_ = spacing;
+        paragraph = initParagraphWithBlock(child);
+        result->push_back(paragraph);
+        spacing = 0;
+        count = 0;
+      }
+    }
+    previous = child;
+  }
+  childBlocks_ = std::move(result);
+}
+
+String RVRecognitionBlock::buildTextString() const {
+  String result;
+  for (const auto& child : *childBlocks_) {
+    if (!child) continue;
+    // Same-line children get no separator: the joins that need a blank are made by
+    // appendBlock/prependBlock.
+    if (child->matchType_ == RVBlockMatchSameColumn) result.push_back(u'\n');
+    if (child->text_) result += *child->text_;
+  }
+  return result;
+}
+
+std::vector<String> RVRecognitionBlock::wordsInBlock() const {
+  if (!text_) return {};
+  std::vector<String> pieces = splitAtWhitespace(*text_);
+  if (text_->size() < 2 || !containsCJKCharacter(*text_)) return pieces;
+  std::vector<String> words;
+  words.reserve(kWordCapacity);
+  for (const String& piece : pieces) {
+    if (!containsCJKCharacter(piece)) {
+      words.push_back(piece);
+      continue;
+    }
+    String pending;
+    for (char16_t unit : piece) {
+      String single(1, unit);
+      if (!containsCJKCharacter(single)) {
+        pending += single;
+        continue;
+      }
+      if (!pending.empty()) words.push_back(pending);
+      pending.clear();
+      words.push_back(single);
+    }
+    // A trailing non-CJK run of a mixed piece is dropped, as word splitting always has.
+  }
+  return words;
+}
+
+RVWritingDirection RVRecognitionBlock::writingDirection() const {
+  if (!text_ || text_->size() < 2 || !containsCJKCharacter(*text_))
+    return RVWritingDirectionHorizontal;
+  return rectGetHeight(boundingBox_) > rectGetWidth(boundingBox_) ? RVWritingDirectionVertical
+                                                                  : RVWritingDirectionHorizontal;
+}
+
+std::optional<String> RVRecognitionBlock::textUsingWritingDirection() const {
+  if (writingDirection() != RVWritingDirectionVertical || !text_ || text_->empty()) return text_;
+  String result(1, (*text_)[0]);
+  for (std::size_t i = 1; i < text_->size(); ++i) {
+    result.push_back(u'\n');
+    result.push_back((*text_)[i]);
+  }
+  return result;
+}
+
+std::shared_ptr<RVRecognitionBlock> RVRecognitionBlock::childBlockForString(const String& string,
+                                                                            bool remove) {
+  auto found = std::find_if(childBlocks_->begin(), childBlocks_->end(), [&](const auto& child) {
+    return child && child->text_ && *child->text_ == string;
+  });
+  if (found == childBlocks_->end()) return nullptr;
+  std::shared_ptr<RVRecognitionBlock> child = *found;
+  if (remove) {
+    std::erase_if(*childBlocks_, [&](const auto& c) { return c && c->isEqual(child); });
+  }
+  return child;
+}
+
+}  // namespace corvel
