@@ -175,7 +175,11 @@ bool RVRecognitionBlock::isEqual(const RVRecognitionBlock* other) const {
 String RVRecognitionBlock::description() const {
   char number[64];
   std::snprintf(number, sizeof number, "%.2f", confidence_);
-  return u"(" + fromUTF8(number) + u"%) '" + (text_ ? *text_ : u"(null)") + u"'";
+  // Built by appending: GCC 12 at -O3 misreads a chain of operator+ here (-Wrestrict).
+  String result(u"(");
+  result.append(fromUTF8(number)).append(u"%) '").append(text_ ? *text_ : u"(null)");
+  result.push_back(u'\'');
+  return result;
 }
 
 PropertyList RVRecognitionBlock::blockInformation() const { return informationOf(*this, 0); }

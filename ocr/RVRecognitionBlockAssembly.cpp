@@ -37,6 +37,14 @@ std::vector<String> splitAtWhitespace(const String& text) {
 // "%@" of a possibly nil string.
 String formatted(const std::optional<String>& text) { return text ? *text : u"(null)"; }
 
+// "%@ %@". Appending rather than chaining operator+, which GCC 12 at -O3 misreads.
+String joinedWithBlank(const std::optional<String>& first, const std::optional<String>& second) {
+  String result = formatted(first);
+  result.push_back(u' ');
+  result.append(formatted(second));
+  return result;
+}
+
 }  // namespace
 
 bool RVRecognitionBlock::containsChild(const std::shared_ptr<RVRecognitionBlock>& block) const {
@@ -89,13 +97,13 @@ void RVRecognitionBlock::insertBlock(const std::shared_ptr<RVRecognitionBlock>& 
 
 void RVRecognitionBlock::appendBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
   if (!block) return;
-  text_ = formatted(text_) + u" " + formatted(block->text_);
+  text_ = joinedWithBlank(text_, block->text_);
   boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
 }
 
 void RVRecognitionBlock::prependBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
   if (!block) return;
-  text_ = formatted(block->text_) + u" " + formatted(text_);
+  text_ = joinedWithBlank(block->text_, text_);
   boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
 }
 
