@@ -109,13 +109,21 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
   Rect boundingBox() const { return boundingBox_; }
   double confidence() const { return confidence_; }
   RVRecognitionBlockLevel level() const { return level_; }
-  // The live array (never null).
-  const std::shared_ptr<RVBlockArray>& childBlocks() const { return childBlocks_; }
+  // The live array (never null). Handing it out means it may change behind this block's
+  // back, so from then on additions take the full path (rebuild the text, rescan the
+  // children) instead of the constant-time one; read through children() where a view is
+  // enough.
+  const std::shared_ptr<RVBlockArray>& childBlocks() const {
+    childrenShared_ = true;
+    return childBlocks_;
+  }
+  // The children, read-only.
+  const RVBlockArray& children() const { return *childBlocks_; }
   // Replaces the array as given, with no other effect (text and box are not rebuilt);
   // nullptr installs a new empty array so childBlocks() stays non-null.
   void setChildBlocks(std::shared_ptr<RVBlockArray> childBlocks);
   RVBlockMatchType matchType() const { return matchType_; }
-  void setMatchType(RVBlockMatchType matchType) { matchType_ = matchType; }
+  void setMatchType(RVBlockMatchType matchType);
   double lineSpacing() const { return lineSpacing_; }
   void setLineSpacing(double lineSpacing) { lineSpacing_ = lineSpacing; }
 
@@ -235,8 +243,22 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
                      RVRecognitionBlockLevel level);
 
  private:
+  // What a container knows about its children while nothing has changed behind it, so
+  // that a block added below all of them costs O(1): the text is extended instead of
+  // rebuilt and the children are not rescanned. Defined in RVRecognitionBlockAssembly.cpp.
+  struct AssemblyCache;
+
   bool containsChild(const std::shared_ptr<RVRecognitionBlock>& block) const;
   void rebuildText();
+  void setText(std::optional<String> text);
+  void setBox(Rect box);
+  // This block's text, box or match type changed: the caches of the containers that hold
+  // it are stale.
+  void changed();
+  void watch(RVRecognitionBlock& child);
+  void invalidateCache();
+  void buildCache();
+  bool appendBelowAll(const std::shared_ptr<RVRecognitionBlock>& block);
 
   std::optional<String> text_;
   double confidence_ = 0;
@@ -245,6 +267,10 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
   RVBlockMatchType matchType_ = RVBlockMatchNone;
   double lineSpacing_ = 0;
   Rect boundingBox_;
+  mutable std::optional<std::uint64_t> textHash_;
+  mutable bool childrenShared_ = false;
+  std::unique_ptr<AssemblyCache> cache_;
+  std::vector<std::weak_ptr<RVRecognitionBlock>> watchers_;
 };
 
 }  // namespace corvel

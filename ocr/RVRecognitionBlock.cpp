@@ -5,6 +5,7 @@
 #include <cmath>
 #include <cstdio>
 
+#include "AssemblyCache.h"
 #include "Corvelbase/platform/Files.h"
 
 namespace corvel {
@@ -83,8 +84,8 @@ PropertyList informationOf(const RVRecognitionBlock& block, int depth) {
   dict[kRVBlockLevelKey] = PropertyList(static_cast<std::uint64_t>(block.level()));
   PropertyList::Array children;
   if (depth < RVRecognitionBlock::kMaxTreeDepth) {
-    children.reserve(block.childBlocks()->size());
-    for (const auto& child : *block.childBlocks()) {
+    children.reserve(block.children().size());
+    for (const auto& child : block.children()) {
       if (child) children.push_back(informationOf(*child, depth + 1));
     }
   }
@@ -132,13 +133,21 @@ std::shared_ptr<RVRecognitionBlock> RVRecognitionBlock::initParagraphWithBlock(
 }
 
 void RVRecognitionBlock::setChildBlocks(std::shared_ptr<RVBlockArray> childBlocks) {
+  // The caller keeps the array it gave us, so it is shared from now on.
+  childrenShared_ = true;
+  invalidateCache();
   childBlocks_ = childBlocks ? std::move(childBlocks) : newChildArray();
 }
 
 void RVRecognitionBlock::setBoundingBox(Rect boundingBox, std::uint64_t forOrigin) {
   if (forOrigin == RVBoundingBoxOriginTopLeft)
     boundingBox.origin.y = 1.0 - (boundingBox.origin.y + boundingBox.size.height);
-  boundingBox_ = boundingBox;
+  setBox(boundingBox);
+}
+
+void RVRecognitionBlock::setMatchType(RVBlockMatchType matchType) {
+  matchType_ = matchType;
+  changed();
 }
 
 Rect RVRecognitionBlock::boundingBoxAtImageOfSize(Size size) const {
@@ -153,8 +162,9 @@ double RVRecognitionBlock::lineSpacingForHeight(double height) const {
 std::shared_ptr<RVRecognitionBlock> RVRecognitionBlock::copy() { return shared_from_this(); }
 
 std::uint64_t RVRecognitionBlock::hash() const {
+  if (!textHash_) textHash_ = textHash(text_);
   return static_cast<std::uint64_t>(level_) + truncateToUnsigned(confidence_ * 10000.0) * 11813u +
-         textHash(text_) * 13411u;
+         *textHash_ * 13411u;
 }
 
 bool RVRecognitionBlock::isEqual(const std::shared_ptr<RVRecognitionBlock>& other) const {

@@ -1,6 +1,9 @@
 // Block assembly: adding members to containers, cutting paragraphs, and the texts, words
 // and writing direction of a block.
 #include <algorithm>
+#include <cmath>
+
+#include "AssemblyCache.h"
 
 #include "Corvelbase/RVRecognitionBlock.h"
 #include "Corvelbase/platform/CJK.h"
@@ -52,20 +55,93 @@ bool RVRecognitionBlock::containsChild(const std::shared_ptr<RVRecognitionBlock>
                      [&](const auto& child) { return child && child->isEqual(block); });
 }
 
-void RVRecognitionBlock::rebuildText() { text_ = buildTextString(); }
+void RVRecognitionBlock::rebuildText() { setText(buildTextString()); }
+
+void RVRecognitionBlock::setText(std::optional<String> text) {
+  text_ = std::move(text);
+  textHash_.reset();
+  invalidateCache();
+  changed();
+}
+
+void RVRecognitionBlock::setBox(Rect box) {
+  boundingBox_ = box;
+  changed();
+}
+
+void RVRecognitionBlock::changed() {
+  // Every watcher's cache goes; they sign up again when they rebuild it.
+  for (const auto& watcher : watchers_) {
+    if (auto container = watcher.lock()) container->invalidateCache();
+  }
+  watchers_.clear();
+}
+
+void RVRecognitionBlock::watch(RVRecognitionBlock& child) {
+  std::weak_ptr<RVRecognitionBlock> self = weak_from_this();
+  for (const auto& watcher : child.watchers_) {
+    if (!watcher.owner_before(self) && !self.owner_before(watcher)) return;
+  }
+  child.watchers_.push_back(std::move(self));
+}
+
+void RVRecognitionBlock::invalidateCache() {
+  if (cache_) cache_->valid = false;
+}
+
+void RVRecognitionBlock::buildCache() {
+  if (childrenShared_) return;
+  if (!cache_) cache_ = std::make_unique<AssemblyCache>();
+  cache_->hashes.clear();
+  cache_->minBottom = std::numeric_limits<double>::infinity();
+  for (const auto& child : *childBlocks_) {
+    if (!child) continue;
+    double bottom = rectGetMinY(child->boundingBox_);
+    if (!std::isnan(bottom)) cache_->minBottom = std::min(cache_->minBottom, bottom);
+    cache_->hashes.insert(child->hash());
+    watch(*child);
+  }
+  cache_->valid = true;
+}
+
+// The common case of lines arriving top to bottom, in O(1): exactly what the full path of
+// addChildBlock does when the block is no child yet and goes at the end. False (nothing
+// done) when the cache cannot tell.
+bool RVRecognitionBlock::appendBelowAll(const std::shared_ptr<RVRecognitionBlock>& block) {
+  if (childrenShared_ || !cache_ || !cache_->valid || !text_ || block.get() == this) return false;
+  std::uint64_t hash = block->hash();
+  if (cache_->hashes.count(hash)) return false;  // maybe a child already: let the scan decide
+  double bottom = rectGetMinY(block->boundingBox_);
+  if (cache_->minBottom < bottom) return false;  // some child lies lower: goes in between
+  childBlocks_->push_back(block);
+  String text = std::move(*text_);
+  if (block->matchType_ == RVBlockMatchSameColumn) text.push_back(u'\n');
+  if (block->text_) text.append(*block->text_);
+  text_ = std::move(text);
+  textHash_.reset();
+  boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+  cache_->hashes.insert(hash);
+  if (!std::isnan(bottom)) cache_->minBottom = std::min(cache_->minBottom, bottom);
+  watch(*block);
+  changed();
+  return true;
+}
 
 void RVRecognitionBlock::addChildBlock(const std::shared_ptr<RVRecognitionBlock>& block,
                                        RVBlockMatchType continuous) {
   if (!block) return;
   block->matchType_ = continuous;
+  block->changed();
+  if (appendBelowAll(block)) return;
   if (containsChild(block)) return;
   double bottom = rectGetMinY(block->boundingBox_);
   auto below = std::find_if(childBlocks_->begin(), childBlocks_->end(), [&](const auto& child) {
     return child && rectGetMinY(child->boundingBox_) < bottom;
   });
   childBlocks_->insert(below, block);
-  boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+  setBox(rectUnion(boundingBox_, block->boundingBox_));
   rebuildText();
+  buildCache();
 }
 
 void RVRecognitionBlock::insertBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
@@ -90,21 +166,21 @@ void RVRecognitionBlock::insertBlock(const std::shared_ptr<RVRecognitionBlock>& 
   // leaves it as it was, which stored analyses depend on.
   if (!placed) {
     childBlocks_->push_back(block);
-    boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+    setBox(rectUnion(boundingBox_, block->boundingBox_));
   }
   rebuildText();
 }
 
 void RVRecognitionBlock::appendBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
   if (!block) return;
-  text_ = joinedWithBlank(text_, block->text_);
-  boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+  setText(joinedWithBlank(text_, block->text_));
+  setBox(rectUnion(boundingBox_, block->boundingBox_));
 }
 
 void RVRecognitionBlock::prependBlock(const std::shared_ptr<RVRecognitionBlock>& block) {
   if (!block) return;
-  text_ = joinedWithBlank(block->text_, text_);
-  boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
+  setText(joinedWithBlank(block->text_, text_));
+  setBox(rectUnion(boundingBox_, block->boundingBox_));
 }
 
 void RVRecognitionBlock::buildParagraphs() {
@@ -144,6 +220,7 @@ void RVRecognitionBlock::buildParagraphs() {
     previous = child;
   }
   childBlocks_ = std::move(result);
+  invalidateCache();
 }
 
 String RVRecognitionBlock::buildTextString() const {
@@ -210,6 +287,7 @@ std::shared_ptr<RVRecognitionBlock> RVRecognitionBlock::childBlockForString(cons
   if (found == childBlocks_->end()) return nullptr;
   std::shared_ptr<RVRecognitionBlock> child = *found;
   if (remove) {
+    invalidateCache();
     std::erase_if(*childBlocks_, [&](const auto& c) { return c && c->isEqual(child); });
   }
   return child;

@@ -137,12 +137,12 @@ void RVTextLayoutAnalyser::sanitizeColumns() {
   // go with it: the order of work has always been this, and results depend on it.
   for (std::size_t i = 0; i < columns.size(); ++i) {
     std::shared_ptr<RVRecognitionBlock> column = columns[i];
-    if (!column || column->childBlocks()->size() != 1) continue;
+    if (!column || column->children().size() != 1) continue;
     for (std::size_t j = 0; j < columns.size(); ++j) {
       const auto& other = columns[j];
       if (!other || other->isEqual(column)) continue;
       if (rectContainsRect(other->boundingBox(), column->boundingBox())) {
-        std::shared_ptr<RVRecognitionBlock> line = column->childBlocks()->front();
+        std::shared_ptr<RVRecognitionBlock> line = column->children().front();
         other->insertBlock(line);
         removals.push_back(column);
         break;
@@ -168,7 +168,7 @@ void RVTextLayoutAnalyser::buildParagraphBlocks(const std::shared_ptr<RVRecognit
   if (!column) return;
   auto paragraphs = std::make_shared<RVBlockArray>();
   paragraphs->reserve(kParagraphCapacity);
-  const RVBlockArray lines = *column->childBlocks();
+  const RVBlockArray lines = column->children();
   for (const auto& line : lines) {
     if (!line) continue;
     RVBlockMatchType matchType = RVBlockMatchNone;

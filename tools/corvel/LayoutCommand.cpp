@@ -158,13 +158,13 @@ void printTree(const RVBlockArray& blocks, int depth, std::ostream& out) {
   for (const auto& block : blocks) {
     if (!block) continue;
     out << std::string(2 * depth, ' ');
-    if (block->childBlocks()->empty()) {
+    if (block->children().empty()) {
       out << toUTF8(block->description()) << '\n';
       continue;
     }
     out << levelName(block->level()) << ' ' << ++number << ' ' << roundedRect(block->boundingBox())
         << '\n';
-    printTree(*block->childBlocks(), depth + 1, out);
+    printTree(block->children(), depth + 1, out);
   }
 }
 
