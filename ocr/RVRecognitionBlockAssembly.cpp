@@ -14,6 +14,7 @@ namespace {
 
 constexpr std::size_t kWordCapacity = 100;
 constexpr std::size_t kChildCapacity = 10;
+constexpr std::size_t kCachedChildren = 16;
 
 // The whitespace-and-newline set that words are split at.
 bool isWhitespaceOrNewline(char16_t u) {
@@ -90,7 +91,8 @@ void RVRecognitionBlock::invalidateCache() {
 }
 
 void RVRecognitionBlock::buildCache() {
-  if (childrenShared_) return;
+  // Small containers (most paragraphs) rebuild in a few steps; a cache would cost more.
+  if (childrenShared_ || childBlocks_->size() < kCachedChildren) return;
   if (!cache_) cache_ = std::make_unique<AssemblyCache>();
   cache_->hashes.clear();
   cache_->minBottom = std::numeric_limits<double>::infinity();

@@ -3,6 +3,9 @@
 #include "Corvelbase/RVTextLayoutAnalyser.h"
 
 #include <algorithm>
+#include <cmath>
+#include <limits>
+#include <vector>
 
 namespace corvel {
 
@@ -35,6 +38,87 @@ void stableSortColumns(RVBlockArray& columns) {
     }
     std::swap(columns, buffer);
   }
+}
+
+constexpr double kInfinity = std::numeric_limits<double>::infinity();
+constexpr std::size_t kNone = std::numeric_limits<std::size_t>::max();
+
+// A line can continue paragraph P only if its top reaches P's key: the same-line test wants
+// the line's bottom at least at L.minY + allowance (L: P's last line), the same-column test
+// its top at least at S.minY - maxLineSeperation (S: P's box), and a bottom never lies above
+// its top. Parts of the key that are NaN make their test fail, so they count as +infinity.
+double paragraphKey(const RVRecognitionBlock& paragraph) {
+  double sameLine = kInfinity;
+  const RVBlockArray& lines = paragraph.children();
+  if (!lines.empty() && lines.back()) {
+    double bound = rectGetMinY(lines.back()->boundingBox()) + allowance;
+    if (!std::isnan(bound)) sameLine = bound;
+  }
+  double sameColumn = rectGetMinY(paragraph.boundingBox()) - maxLineSeperation;
+  if (std::isnan(sameColumn)) sameColumn = kInfinity;
+  return std::min(sameLine, sameColumn);
+}
+
+// The paragraphs' keys in a min-tree, so that the earliest paragraph that might take a
+// line is found in O(log n) instead of asking every paragraph above it. Keys only change
+// when a paragraph takes a line.
+class ParagraphIndex {
+ public:
+  void push(double key) {
+    if (size_ == capacity_) grow();
+    set(size_++, key);
+  }
+  void set(std::size_t i, double key) {
+    std::size_t node = capacity_ + i;
+    tree_[node] = key;
+    for (node /= 2; node > 0; node /= 2)
+      tree_[node] = std::min(tree_[2 * node], tree_[2 * node + 1]);
+  }
+  // The first index at or after `from` whose key is at most `top`, or kNone.
+  std::size_t firstAtMost(double top, std::size_t from) const {
+    return size_ == 0 ? kNone : find(1, 0, capacity_, top, from);
+  }
+
+ private:
+  std::size_t find(std::size_t node, std::size_t lo, std::size_t hi, double top,
+                   std::size_t from) const {
+    if (hi <= from || !(tree_[node] <= top)) return kNone;
+    if (hi - lo == 1) return lo < size_ ? lo : kNone;
+    std::size_t mid = lo + (hi - lo) / 2;
+    std::size_t left = find(2 * node, lo, mid, top, from);
+    return left != kNone ? left : find(2 * node + 1, mid, hi, top, from);
+  }
+  void grow() {
+    std::vector<double> keys(tree_.begin() + static_cast<std::ptrdiff_t>(capacity_),
+                             tree_.begin() + static_cast<std::ptrdiff_t>(capacity_ + size_));
+    capacity_ = capacity_ == 0 ? 8 : 2 * capacity_;
+    tree_.assign(2 * capacity_, kInfinity);
+    std::size_t count = size_;
+    size_ = 0;
+    for (std::size_t i = 0; i < count; ++i) set(size_++, keys[i]);
+  }
+
+  std::size_t size_ = 0, capacity_ = 0;
+  std::vector<double> tree_;
+};
+
+// The earliest paragraph that takes `line` (its position and the match type), asking only
+// the paragraphs whose key allows it; the same answer as asking every one in order.
+std::size_t findParagraph(const RVRecognitionBlock& line, const RVBlockArray& paragraphs,
+                          const ParagraphIndex& index, RVBlockMatchType* matchType) {
+  Rect box = line.boundingBox();
+  double top = rectGetMaxY(box);
+  bool indexed = !std::isnan(top) && rectGetMinY(box) <= top;
+  for (std::size_t i = indexed ? index.firstAtMost(top, 0) : 0; i < paragraphs.size();
+       i = indexed ? index.firstAtMost(top, i + 1) : i + 1) {
+    if (!paragraphs[i]) continue;
+    RVBlockMatchType found = paragraphs[i]->isContinuous(box);
+    if (found != RVBlockMatchNone) {
+      *matchType = found;
+      return i;
+    }
+  }
+  return kNone;
 }
 
 }  // namespace
@@ -168,18 +252,22 @@ void RVTextLayoutAnalyser::buildParagraphBlocks(const std::shared_ptr<RVRecognit
   if (!column) return;
   auto paragraphs = std::make_shared<RVBlockArray>();
   paragraphs->reserve(kParagraphCapacity);
+  ParagraphIndex index;
   const RVBlockArray lines = column->children();
   for (const auto& line : lines) {
     if (!line) continue;
     RVBlockMatchType matchType = RVBlockMatchNone;
-    if (auto paragraph = isContinuous(line, *paragraphs, &matchType)) {
-      paragraph->addChildBlock(line, matchType);
+    std::size_t found = findParagraph(*line, *paragraphs, index, &matchType);
+    if (found != kNone) {
+      (*paragraphs)[found]->addChildBlock(line, matchType);
+      index.set(found, paragraphKey(*(*paragraphs)[found]));
       continue;
     }
     auto paragraph = RVRecognitionBlock::initWithText(
         String(), line->boundingBox(), line->confidence(), RVRecognitionBlockLevelParagraph);
     paragraph->addChildBlock(line, RVBlockMatchNone);
     paragraphs->push_back(paragraph);
+    index.push(paragraphKey(*paragraph));
   }
   column->setChildBlocks(paragraphs);
 }
