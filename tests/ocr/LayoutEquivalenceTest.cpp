@@ -76,6 +76,11 @@ TEST(LayoutEquivalence, AddingChildrenMatchesThePlainRebuild) {
         ASSERT_EQ(container->text(), container->buildTextString())
             << "round " << round << " step " << step;
         ASSERT_EQ(container->boundingBox(), box);
+        // The hash carried along with the text equals one computed afresh.
+        ASSERT_EQ(container->hash(),
+                  RVRecognitionBlock::initWithText(container->text(), box, container->confidence(),
+                                                   container->level())
+                      ->hash());
       } else if (pick < 0.85) {
         // A child changes behind the container's back.
         shadow[random() % shadow.size()]->setMatchType(static_cast<RVBlockMatchType>(random() % 3));
