@@ -4,6 +4,7 @@
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Geometry.h"
+#include "Corvelbase/platform/Image.h"
 #include "Corvelbase/platform/Log.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/PropertyList.h"
