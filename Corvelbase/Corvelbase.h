@@ -8,3 +8,4 @@
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/PropertyList.h"
 #include "Corvelbase/platform/String.h"
+#include "Corvelbase/platform/TypeRegistry.h"
