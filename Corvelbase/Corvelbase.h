@@ -1,6 +1,7 @@
 // Umbrella header: everything a host needs.
 #pragma once
 
+#include "Corvelbase/UTI.h"
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Geometry.h"
