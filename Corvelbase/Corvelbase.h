@@ -1,6 +1,7 @@
 // Umbrella header: everything a host needs.
 #pragma once
 
+#include "Corvelbase/UTI.h"
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Geometry.h"
@@ -11,3 +12,4 @@
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/PropertyList.h"
 #include "Corvelbase/platform/String.h"
+#include "Corvelbase/platform/TypeRegistry.h"
