@@ -8,7 +8,7 @@
 namespace corvel::AsianCharacters {
 namespace {
 
-// U+2E80 to U+9FFF, written as the unsigned test the range was first defined by.
+// U+2E80 to U+9FFF in one unsigned comparison: units below the start wrap to large values.
 constexpr uint32_t kRangeStart = 0x2E80;
 constexpr uint32_t kRangeBlocks = 226;  // (0x9FFF - 0x2E80) >> 7
 constexpr bool isAsianUnit(char16_t unit) {
