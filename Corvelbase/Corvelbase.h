@@ -1,6 +1,9 @@
 // Umbrella header: everything a host needs.
 #pragma once
 
+#include "Corvelbase/AsianCharacters.h"
+#include "Corvelbase/Email.h"
+#include "Corvelbase/Language.h"
 #include "Corvelbase/UTI.h"
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
