@@ -20,7 +20,11 @@ constexpr char16_t kClosingDiv[] = u"</div>\n";
 String insertInlineCodeBlock(const String& text, Range range) {
   const Range selection = internal::clampToText(text, range);
   if (selection.length == 0) return u"``";
-  return u"`" + internal::substring(text, selection) + u"`";
+  String code(u"`");
+  code.append(text, static_cast<std::size_t>(selection.location),
+              static_cast<std::size_t>(selection.length));
+  code.push_back(u'`');
+  return code;
 }
 
 std::optional<String> insertCodeBlock(const String& text, Range range, Range* replacementRange) {
