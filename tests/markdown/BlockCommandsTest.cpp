@@ -17,6 +17,8 @@ TEST(InlineCode, WrapsTheSelectionInBackticks) {
   EXPECT_EQ(md::insertInlineCodeBlock(u"abc", {1, 0}), u"``");
   EXPECT_EQ(md::insertInlineCodeBlock(u"abc", {0, kMax}), u"`abc`");
   EXPECT_EQ(md::insertInlineCodeBlock(u"abc", {5, 2}), u"``");
+  // A selection that splits a surrogate pair is taken as given.
+  EXPECT_EQ(md::insertInlineCodeBlock(u"\U0001F600x", {1, 1}), u"`\xDE00`");
 }
 
 TEST(CodeBlock, FencesTheSelectionOnLinesOfItsOwn) {

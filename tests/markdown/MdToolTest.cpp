@@ -27,17 +27,11 @@ TEST(MdTool, PrintsTheCommandsAnswerAsJSON) {
        R"({"text":"","replacementRange":[0,3],"selectionRange":null})"},
       {"abc", "insertInlineCodeBlock --selection 1,1",
        R"({"text":"`b`","replacementRange":null,"selectionRange":null})"},
-      {"x", "insertTable --selection 0,0 --rows 1 --columns 1",
-       R"({"text":"\n|   |\n|:--|\n","replacementRange":[1,0],"selectionRange":null})"},
-      {"x", "insertHTMLJustity --selection 0,1 --alignment 2",
-       R"({"text":"<div align=\"right\">\nx</div>\n","replacementRange":[0,1],"selectionRange":null})"},
       // Ranges count UTF-16 units: the emoji is two.
       {"\xF0\x9F\x98\x80 a\nb", "insertQuote --selection 3,0",
        R"({"text":"> 😀 a\n","replacementRange":[0,5],"selectionRange":[5,0]})"},
       {"[a](u)", "lineContainsMarkdownLink --selection 1,0",
        R"({"result":true,"linkRange":[0,6],"textRange":[1,1]})"},
-      {"", "headerForLevel --level 2",
-       R"({"text":"## ","replacementRange":null,"selectionRange":null})"},
   };
   for (const Case& c : cases) {
     testing::CommandResult r = md(c.document, c.args);
@@ -59,13 +53,11 @@ TEST(MdTool, MisuseExitsWithStatusTwo) {
       "insertTaskLists --selection 0,0",  // unknown command
       "insertTaskList",                   // no selection
       "insertTaskList --selection 0",     // malformed range
-      "insertTaskList --selection -1,0",  // negative
       "insertTaskList --selection 0,99",  // beyond the document
       "insertTaskList --selection 18446744073709551615,1",
       "insertTable --selection 0,0 --rows 1",      // missing --columns
       "insertTaskList --selection 0,0 --level 2",  // option of another command
       "lineContainsMarkdownLink --selection 0,0 --apply",
-      "setMarkdownHeaderLevel --selection 0,0 --level x",
   };
   for (const char* args : bad) {
     testing::CommandResult r = md("abc", args);

@@ -43,6 +43,7 @@ TEST(LinePrefix, TogglesThePrefixOnEveryTouchedLine) {
       {"empty line gets it", u"a\n\nb", {2, 0}, u"- \n", {2, 1}, {4, 0}},
       {"shorter than prefix", u"-", {0, 1}, u"- -", {0, 1}, {0, 3}},
       {"whole document", u"x\ny\nz", {0, 5}, u"- x\n- y\n- z", {0, 5}, {0, 11}},
+      {"unpaired surrogates", u"\xDC00\n\xD800", {0, 3}, u"- \xDC00\n- \xD800", {0, 3}, {0, 7}},
   };
   for (const EditCase& c : cases) expectEdits(bullets, c);
 }

@@ -294,8 +294,7 @@ int runQuery(const Options& o, const String& document) {
   } else if (o.command == "lineContainsMarkdownLink") {
     Range link = NotFoundRange;
     std::optional<Range> text;
-    Range textRange;
-    textRange.location = NotFound;
+    Range textRange = NotFoundRange;  // stays so when no "](" was seen
     bool found = md::lineContainsMarkdownLink(document, selection, &link, &textRange);
     if (textRange.location != NotFound) text = textRange;
     out = {{"result", found}, {"linkRange", rangeJSON(link)}, {"textRange", rangeJSON(text)}};
