@@ -1,8 +1,12 @@
 // Umbrella header: everything a host needs.
 #pragma once
 
+#include "Corvelbase/RVMXTextAttachment.h"
 #include "Corvelbase/UTI.h"
+#include "Corvelbase/platform/AttributedString.h"
+#include "Corvelbase/platform/Base64.h"
 #include "Corvelbase/platform/Error.h"
+#include "Corvelbase/platform/FileWrapper.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Geometry.h"
 #include "Corvelbase/platform/Image.h"
@@ -11,5 +15,7 @@
 #include "Corvelbase/platform/Pasteboard.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/PropertyList.h"
+#include "Corvelbase/platform/RTFD.h"
 #include "Corvelbase/platform/String.h"
+#include "Corvelbase/platform/TextAttachment.h"
 #include "Corvelbase/platform/TypeRegistry.h"
