@@ -213,8 +213,12 @@ std::shared_ptr<FileWrapper> FileWrapper::initRegularFileWithContents(Data conte
 std::shared_ptr<FileWrapper> FileWrapper::initDirectoryWithFileWrappers(const Children& children) {
   auto w = FileWrapperAccess::make();
   w->isDirectory_ = true;
-  for (const auto& [name, child] : children)
-    if (child && isSafeFileName(name)) w->children_.emplace(name, child);
+  for (const auto& [name, child] : children) {
+    if (!child || !isSafeFileName(name)) continue;
+    child->filename_ = name;
+    if (!child->preferredFilename_) child->preferredFilename_ = name;
+    w->children_.emplace(name, child);
+  }
   return w;
 }
 
@@ -250,6 +254,8 @@ std::string FileWrapper::addFileWrapper(std::shared_ptr<FileWrapper> child,
   std::string stem = dot == std::string::npos || dot == 0 ? name : name.substr(0, dot);
   std::string extension = stem.size() == name.size() ? "" : name.substr(dot);
   for (int n = 2; children_.count(unique); ++n) unique = stem + " " + std::to_string(n) + extension;
+  child->filename_ = unique;
+  if (!child->preferredFilename_) child->preferredFilename_ = unique;
   children_.emplace(unique, std::move(child));
   return unique;
 }

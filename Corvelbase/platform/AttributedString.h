@@ -117,7 +117,7 @@ class CORVEL_EXPORT AttributedString {
   bool isEditing() const { return editing_ > 0; }
 
   // Equal text and equal attributes on every character.
-  friend bool operator==(const AttributedString& a, const AttributedString& b);
+  friend CORVEL_EXPORT bool operator==(const AttributedString& a, const AttributedString& b);
 
  private:
   struct Run {

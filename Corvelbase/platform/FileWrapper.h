@@ -33,8 +33,9 @@ class CORVEL_EXPORT FileWrapper {
   static std::shared_ptr<FileWrapper> initWithPath(const std::string& path);
   // A regular file holding `contents`, without a name.
   static std::shared_ptr<FileWrapper> initRegularFileWithContents(Data contents);
-  // A directory holding `children` under the map's names. Empty names, "." and "..",
-  // names with '/' or NUL, and null children are left out.
+  // A directory holding `children` under the map's names, which become the children's
+  // filenames (and their preferredFilenames where they have none). Empty names, "." and
+  // "..", names with '/' or NUL, and null children are left out.
   static std::shared_ptr<FileWrapper> initDirectoryWithFileWrappers(const Children& children);
   // The wrapper serialised by serializedRepresentation(); nullptr for bytes that are not
   // such a serialisation (truncated, lengths past the end, nesting deeper than 32).
@@ -59,9 +60,10 @@ class CORVEL_EXPORT FileWrapper {
   const Children& fileWrappers() const { return children_; }
 
   // Adds `child` to this directory under its preferredFilename (else its filename),
-  // made unique by " 2", " 3"... before the extension when the name is taken. The
-  // child's own names are left as they are. Returns the name used, or "" when this is no
-  // directory, the child is null or has no usable name (see initDirectoryWithFileWrappers).
+  // made unique by " 2", " 3"... before the extension when the name is taken; the name
+  // used becomes the child's filename (and its preferredFilename if it has none).
+  // Returns that name, or "" when this is no directory, the child is null or has no
+  // usable name (see initDirectoryWithFileWrappers).
   std::string addFileWrapper(std::shared_ptr<FileWrapper> child);
   // The same under `name` (made unique) instead of the child's own names.
   std::string addFileWrapper(std::shared_ptr<FileWrapper> child, const std::string& name);

@@ -39,7 +39,16 @@ std::optional<Size> sizeOf(const TextAttachment& attachment) {
   return std::nullopt;
 }
 
-// The file an attachment is written with, and the name it asks for.
+// A new wrapper with the same contents, so that naming it in the bundle leaves the
+// attachment's own wrapper (whose name may identify it) untouched.
+std::shared_ptr<FileWrapper> copyOf(const FileWrapper& wrapper) {
+  if (wrapper.isRegularFile())
+    return FileWrapper::initRegularFileWithContents(*wrapper.regularFileContents());
+  return FileWrapper::initDirectoryWithFileWrappers(wrapper.fileWrappers());
+}
+
+// The file an attachment is written with, and the name it asks for; null when the
+// attachment has nothing to write.
 std::pair<std::shared_ptr<FileWrapper>, std::string> fileOf(const TextAttachment& attachment) {
   if (auto wrapper = attachment.fileWrapper())
     return {wrapper, wrapper->preferredFilename().value_or(wrapper->filename().value_or(""))};
@@ -93,15 +102,17 @@ std::shared_ptr<FileWrapper> RTFDFileWrapperFromRange(const AttributedString& te
   // Held first so no attachment can take its name.
   bundle->addFileWrapper(FileWrapper::initRegularFileWithContents({}), RTFDTextFileName);
   std::map<const FileWrapper*, std::string> written;
+  std::vector<std::shared_ptr<FileWrapper>> held;
   rtfd::AttachmentNamer namer = [&](const std::shared_ptr<TextAttachment>& attachment)
       -> std::optional<rtfd::AttachmentReference> {
     auto [file, wanted] = fileOf(*attachment);
     if (!file) return std::nullopt;
     auto it = written.find(file.get());
     std::string name =
-        it != written.end() ? it->second : bundle->addFileWrapper(file, safeName(wanted));
+        it != written.end() ? it->second : bundle->addFileWrapper(copyOf(*file), safeName(wanted));
     if (name.empty()) return std::nullopt;
     written.emplace(file.get(), name);
+    held.push_back(file);  // keeps the address in `written` unique while writing
     return rtfd::AttachmentReference{name, sizeOf(*attachment)};
   };
   std::string rtf = rtfd::writeRTF(text, range, namer);
