@@ -194,7 +194,11 @@ class Parser {
     if (c == '\'') {
       int high = pos_ < n_ ? hexValue(p_[pos_]) : -1;
       int low = pos_ + 1 < n_ ? hexValue(p_[pos_ + 1]) : -1;
-      if (high < 0 || low < 0) return;
+      if (high < 0) return;  // not an escape: what follows is text
+      if (low < 0) {
+        ++pos_;  // a cut escape goes with its one digit
+        return;
+      }
       pos_ += 2;
       textByte(static_cast<std::uint8_t>(high * 16 + low));
       return;
@@ -223,7 +227,11 @@ class Parser {
 
   void controlWord() {
     std::size_t start = pos_;
-    while (pos_ < n_ && isLetter(p_[pos_])) ++pos_;
+    // Hostile documents carry words of any length: keep this scan tight.
+    const std::uint8_t* q = p_ + pos_;
+    const std::uint8_t* end = p_ + n_;
+    while (q < end && static_cast<unsigned>((*q | 0x20) - 'a') < 26u) ++q;
+    pos_ = static_cast<std::size_t>(q - p_);
     std::size_t length = pos_ - start;
     std::string_view word(reinterpret_cast<const char*>(p_ + start),
                           length <= kMaxWordLength ? length : 0);
