@@ -1,0 +1,315 @@
+#include <algorithm>
+#include <cctype>
+#include <cmath>
+#include <cstdlib>
+#include <mutex>
+
+#include "Corvelbase/platform/Files.h"
+#include "platform/image/BitmapNative.h"
+
+namespace corvel {
+
+namespace {
+
+// Leptonica reports problems on stderr by default; ours go into failure reasons instead.
+void quietLeptonica() {
+  static std::once_flag once;
+  std::call_once(once, [] { setMsgSeverity(L_SEVERITY_NONE); });
+}
+
+bool withinBudget(std::uint64_t width, std::uint64_t height) {
+  return width > 0 && height > 0 && width * height <= kMaxImagePixels;
+}
+
+std::string formatName(l_int32 format) {
+  switch (format) {
+    case IFF_PNG:
+      return "PNG";
+    case IFF_JFIF_JPEG:
+      return "JPEG";
+    case IFF_GIF:
+      return "GIF";
+    case IFF_WEBP:
+      return "WebP";
+    case IFF_BMP:
+      return "BMP";
+    case IFF_PNM:
+      return "PNM";
+    default:
+      return "TIFF";
+  }
+}
+
+std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure) {
+  quietLeptonica();
+  l_int32 format = IFF_UNKNOWN;
+  if (bytes.size() < 12 || findFileFormatBuffer(bytes.data(), &format) != 0 ||
+      format == IFF_UNKNOWN || format == IFF_SPIX || format == IFF_JP2 || format == IFF_PS ||
+      format == IFF_LPDF || format == IFF_DEFAULT) {
+    *failure = "the data is not an image in a supported format";
+    return nullptr;
+  }
+  l_int32 width = 0, height = 0, bps = 0, spp = 0, colormapped = 0, headerFormat = 0;
+  if (pixReadHeaderMem(bytes.data(), bytes.size(), &headerFormat, &width, &height, &bps, &spp,
+                       &colormapped) != 0) {
+    *failure = "the " + formatName(format) + " image is corrupt or truncated";
+    return nullptr;
+  }
+  if (width <= 0 || height <= 0) {
+    *failure = "the image has no pixels";
+    return nullptr;
+  }
+  if (!withinBudget(static_cast<std::uint64_t>(width), static_cast<std::uint64_t>(height))) {
+    *failure = "the image is too large (" + std::to_string(width) + " x " + std::to_string(height) +
+               " pixels; at most " + std::to_string(kMaxImagePixels / 1'000'000) + " megapixels)";
+    return nullptr;
+  }
+  PIX* pix = pixReadMem(bytes.data(), bytes.size());
+  if (!pix) {
+    *failure = "the " + formatName(format) + " image is corrupt or truncated";
+    return nullptr;
+  }
+  return bitmapFromPix(pix, failure);
+}
+
+std::string decodePercentEscapes(std::string_view text) {
+  std::string out;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    if (text[i] == '%' && i + 2 < text.size() &&
+        std::isxdigit(static_cast<unsigned char>(text[i + 1])) &&
+        std::isxdigit(static_cast<unsigned char>(text[i + 2]))) {
+      out += static_cast<char>(std::stoi(std::string(text.substr(i + 1, 2)), nullptr, 16));
+      i += 2;
+    } else {
+      out += text[i];
+    }
+  }
+  return out;
+}
+
+// The file path a URL names, or nullopt with the reason it names none we can read.
+std::optional<std::string> pathOfFileURL(const std::string& url, std::string* failure) {
+  std::size_t colon = url.find(':');
+  std::string scheme = colon == std::string::npos ? "" : url.substr(0, colon);
+  std::transform(scheme.begin(), scheme.end(), scheme.begin(),
+                 [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
+  if (scheme != "file") {
+    *failure = scheme.empty() ? "\"" + url + "\" is not a URL"
+                              : "URLs with the scheme \"" + scheme + "\" cannot be read";
+    return std::nullopt;
+  }
+  std::string_view rest = std::string_view(url).substr(colon + 1);
+  if (rest.starts_with("//")) {
+    rest.remove_prefix(2);
+    std::size_t slash = rest.find('/');
+    std::string_view host = rest.substr(0, slash);
+    if (!host.empty() && host != "localhost") {
+      *failure = "file URLs on another host (\"" + std::string(host) + "\") cannot be read";
+      return std::nullopt;
+    }
+    rest = slash == std::string_view::npos ? std::string_view() : rest.substr(slash);
+  }
+  if (rest.empty()) {
+    *failure = "the URL \"" + url + "\" names no file";
+    return std::nullopt;
+  }
+  return decodePercentEscapes(rest);
+}
+
+}  // namespace
+
+std::shared_ptr<Bitmap> bitmapFromPix(PIX* pix, std::string* failure) {
+  if (!pix) return nullptr;
+  auto fail = [&](const std::string& why) -> std::shared_ptr<Bitmap> {
+    pixDestroy(&pix);
+    if (failure) *failure = why;
+    return nullptr;
+  };
+  if (!withinBudget(static_cast<std::uint64_t>(std::max(0, pixGetWidth(pix))),
+                    static_cast<std::uint64_t>(std::max(0, pixGetHeight(pix))))) {
+    return fail("the image has no pixels or is too large");
+  }
+  PIX* normal = nullptr;
+  if (pixGetColormap(pix)) {
+    normal = pixRemoveColormap(pix, REMOVE_CMAP_BASED_ON_SRC);
+  } else if (pixGetDepth(pix) == 16) {
+    normal = pixConvert16To8(pix, L_MS_BYTE);
+  } else if (pixGetDepth(pix) == 2 || pixGetDepth(pix) == 4) {
+    normal = pixConvertTo8(pix, 0);
+  }
+  if (normal) {
+    pixDestroy(&pix);
+    pix = normal;
+  }
+  l_int32 depth = pixGetDepth(pix);
+  if (depth != 1 && depth != 8 && depth != 32) {
+    return fail("the image's pixel format (" + std::to_string(depth) + " bits) is not supported");
+  }
+  return std::make_shared<Bitmap>(std::make_unique<Bitmap::Native>(pix));
+}
+
+// --- Bitmap -------------------------------------------------------------------------
+
+Bitmap::Bitmap(std::unique_ptr<Native> native) : native_(std::move(native)) {}
+Bitmap::~Bitmap() = default;
+
+std::uint32_t Bitmap::width() const {
+  return static_cast<std::uint32_t>(pixGetWidth(native_->pix));
+}
+std::uint32_t Bitmap::height() const {
+  return static_cast<std::uint32_t>(pixGetHeight(native_->pix));
+}
+
+std::shared_ptr<Bitmap> Bitmap::fromRGBA(std::uint32_t width, std::uint32_t height,
+                                         const std::uint8_t* rgba, std::size_t size) {
+  if (!rgba || !withinBudget(width, height) ||
+      size / 4 / width < height) {  // written to avoid overflow
+    return nullptr;
+  }
+  PIX* pix = pixCreate(static_cast<l_int32>(width), static_cast<l_int32>(height), 32);
+  if (!pix) return nullptr;
+  pixSetSpp(pix, 4);
+  l_uint32* data = pixGetData(pix);
+  l_int32 wpl = pixGetWpl(pix);
+  for (std::uint32_t y = 0; y < height; ++y) {
+    l_uint32* line = data + static_cast<std::size_t>(y) * static_cast<std::size_t>(wpl);
+    const std::uint8_t* src = rgba + static_cast<std::size_t>(y) * width * 4;
+    for (std::uint32_t x = 0; x < width; ++x, src += 4) {
+      line[x] = (static_cast<l_uint32>(src[0]) << 24) | (static_cast<l_uint32>(src[1]) << 16) |
+                (static_cast<l_uint32>(src[2]) << 8) | src[3];
+    }
+  }
+  return std::make_shared<Bitmap>(std::make_unique<Native>(pix));
+}
+
+Data Bitmap::rgba() const {
+  PIX* pix = native_->pix;
+  std::size_t w = width(), h = height();
+  Data out(w * h * 4);
+  l_uint32* data = pixGetData(pix);
+  l_int32 wpl = pixGetWpl(pix);
+  l_int32 depth = pixGetDepth(pix);
+  bool hasAlpha = depth == 32 && pixGetSpp(pix) == 4;
+  std::uint8_t* dst = out.data();
+  for (std::size_t y = 0; y < h; ++y) {
+    l_uint32* line = data + y * static_cast<std::size_t>(wpl);
+    for (std::size_t x = 0; x < w; ++x, dst += 4) {
+      if (depth == 32) {
+        l_uint32 v = line[x];
+        dst[0] = static_cast<std::uint8_t>(v >> 24);
+        dst[1] = static_cast<std::uint8_t>(v >> 16);
+        dst[2] = static_cast<std::uint8_t>(v >> 8);
+        dst[3] = hasAlpha ? static_cast<std::uint8_t>(v) : 255;
+      } else {
+        std::uint8_t grey = depth == 8 ? static_cast<std::uint8_t>(GET_DATA_BYTE(line, x))
+                                       : (GET_DATA_BIT(line, x) ? 0 : 255);  // 1 bit: set is black
+        dst[0] = dst[1] = dst[2] = grey;
+        dst[3] = 255;
+      }
+    }
+  }
+  return out;
+}
+
+std::optional<Data> jpegDataForBitmap(const Bitmap& bitmap, double compressionFactor) {
+  quietLeptonica();
+  PIX* source = bitmap.native().pix;
+  PIX* owned = nullptr;
+  if (pixGetDepth(source) == 1) {
+    owned = pixConvertTo8(source, 0);
+  } else if (pixGetDepth(source) == 32 && pixGetSpp(source) == 4) {
+    owned = pixAlphaBlendUniform(source, 0xffffff00);  // over white
+  }
+  PIX* pix = owned ? owned : source;
+  if (!pix) return std::nullopt;
+  double factor = std::isnan(compressionFactor) ? 0 : std::clamp(compressionFactor, 0.0, 1.0);
+  l_int32 quality = std::clamp(static_cast<l_int32>(std::lround(factor * 100)), 1, 100);
+  l_uint8* bytes = nullptr;
+  size_t size = 0;
+  bool ok = pixWriteMemJpeg(&bytes, &size, pix, quality, 0) == 0 && bytes;
+  if (owned) pixDestroy(&owned);
+  if (!ok) {
+    if (bytes) lept_free(bytes);
+    return std::nullopt;
+  }
+  Data out(bytes, bytes + size);
+  lept_free(bytes);
+  return out;
+}
+
+// --- Image --------------------------------------------------------------------------
+
+Image::~Image() = default;
+
+std::shared_ptr<Image> Image::initByReferencingFile(const std::string& path) {
+  std::shared_ptr<Image> image(new Image);
+  image->path_ = path;
+  if (path.empty()) image->sourceError_ = "no file was named";
+  return image;
+}
+
+std::shared_ptr<Image> Image::initByReferencingURL(const std::string& url) {
+  std::shared_ptr<Image> image(new Image);
+  if (auto path = pathOfFileURL(url, &image->sourceError_)) image->path_ = *path;
+  return image;
+}
+
+std::shared_ptr<Image> Image::initWithData(const Data& data) {
+  std::string failure;
+  auto bitmap = decodeBytes(data, &failure);
+  if (!bitmap) return nullptr;
+  return initWithBitmap(std::move(bitmap));
+}
+
+std::shared_ptr<Image> Image::initWithBitmap(std::shared_ptr<Bitmap> bitmap) {
+  if (!bitmap) return nullptr;
+  std::shared_ptr<Image> image(new Image);
+  image->bitmap_ = std::move(bitmap);
+  std::call_once(image->decodeOnce_, [] {});  // already decoded
+  return image;
+}
+
+void Image::decode() const {
+  std::call_once(decodeOnce_, [this] {
+    if (!sourceError_.empty()) {
+      failure_ = sourceError_;
+      return;
+    }
+    auto bytes = readFile(path_);
+    if (!bytes) {
+      failure_ = "the file \"" + path_ + "\" cannot be read";
+      return;
+    }
+    bitmap_ = decodeBytes(*bytes, &failure_);
+    if (!bitmap_) failure_ = "\"" + path_ + "\": " + failure_;
+  });
+}
+
+std::shared_ptr<Bitmap> Image::bitmap() const {
+  decode();
+  return bitmap_;
+}
+
+std::string Image::failureReason() const {
+  decode();
+  return failure_;
+}
+
+Size Image::size() const {
+  auto b = bitmap();
+  return b ? Size{static_cast<double>(b->width()), static_cast<double>(b->height())} : Size{};
+}
+
+std::vector<std::shared_ptr<Bitmap>> Image::representations() const {
+  auto b = bitmap();
+  if (!b) return {};
+  return {b};
+}
+
+std::optional<Data> Image::jpegData(double compressionFactor) const {
+  auto b = bitmap();
+  if (!b) return std::nullopt;
+  return jpegDataForBitmap(*b, compressionFactor);
+}
+
+}  // namespace corvel

@@ -1,0 +1,144 @@
+#include <gtest/gtest.h>
+
+#include <filesystem>
+
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/Image.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+Data fixtureBytes(const std::string& name) {
+  auto bytes = readFile(testing::fixturePath("images/" + name));
+  EXPECT_TRUE(bytes) << name;
+  return bytes.value_or(Data{});
+}
+
+// The fixtures are 24 x 16: red grows with x, green with y, blue is full on the left half.
+TEST(Image, DecodesEveryFormatWithItsPixels) {
+  struct Case {
+    const char* file;
+    bool lossless;
+  } cases[] = {{"sample.png", true}, {"sample.tif", true},   {"sample.bmp", true},
+               {"sample.pnm", true}, {"sample.webp", false}, {"sample.jpg", false},
+               {"sample.gif", false}};
+  for (const auto& c : cases) {
+    auto image =
+        Image::initByReferencingFile(testing::fixturePath(std::string("images/") + c.file));
+    auto bitmap = image->bitmap();
+    ASSERT_TRUE(bitmap) << c.file << ": " << image->failureReason();
+    EXPECT_EQ(image->failureReason(), "");
+    EXPECT_EQ(image->size(), (Size{24, 16})) << c.file;
+    Data rgba = bitmap->rgba();
+    ASSERT_EQ(rgba.size(), 24u * 16 * 4);
+    // Pixel (x=20, y=10): red 200, green 150, blue 0.
+    const std::uint8_t* p = &rgba[(10 * 24 + 20) * 4];
+    int tolerance = c.lossless ? 0 : 24;
+    EXPECT_NEAR(p[0], 200, tolerance) << c.file;
+    EXPECT_NEAR(p[1], 150, tolerance) << c.file;
+    EXPECT_NEAR(p[2], 0, tolerance) << c.file;
+    EXPECT_EQ(p[3], 255) << c.file;
+  }
+}
+
+TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
+  Data png = fixtureBytes("sample.png");
+  Data truncated(png.begin(), png.begin() + static_cast<long>(png.size() / 2));
+  Data jpeg = fixtureBytes("sample.jpg");
+  Data corrupt = jpeg;
+  for (std::size_t i = 200; i < corrupt.size(); ++i) corrupt[i] = 0x5a;
+  std::string text = "just some text, not an image";
+  // A PNG whose header claims 30000 x 30000 pixels.
+  Data huge = png;
+  huge[16] = 0, huge[17] = 0, huge[18] = 0x75, huge[19] = 0x30;
+  huge[20] = 0, huge[21] = 0, huge[22] = 0x75, huge[23] = 0x30;
+  struct Case {
+    const char* name;
+    Data bytes;
+    const char* reasonWord;
+  } cases[] = {{"empty", {}, "not an image"},
+               {"text", Data(text.begin(), text.end()), "not an image"},
+               {"truncated png", truncated, "corrupt or truncated"},
+               {"huge png", huge, "too large"}};
+  testing::TempDir dir;
+  for (const auto& c : cases) {
+    EXPECT_FALSE(Image::initWithData(c.bytes)) << c.name;
+    std::string path = dir.file(std::string(c.name) + ".img");
+    ASSERT_TRUE(writeFileAtomically(path, c.bytes));
+    auto image = Image::initByReferencingFile(path);
+    EXPECT_FALSE(image->bitmap()) << c.name;
+    EXPECT_NE(image->failureReason().find(c.reasonWord), std::string::npos)
+        << c.name << ": " << image->failureReason();
+    EXPECT_EQ(image->size(), Size{});
+    EXPECT_TRUE(image->representations().empty());
+    EXPECT_FALSE(image->jpegData(0.9));
+  }
+  // A JPEG with garbage after its header decodes to something or fails; never crashes.
+  auto damaged = Image::initWithData(corrupt);
+  if (damaged) {
+    EXPECT_EQ(damaged->size(), (Size{24, 16}));
+  }
+  auto missing = Image::initByReferencingFile(dir.file("missing.png"));
+  EXPECT_FALSE(missing->bitmap());
+  EXPECT_NE(missing->failureReason().find("cannot be read"), std::string::npos);
+  auto directory = Image::initByReferencingFile(dir.path());
+  EXPECT_FALSE(directory->bitmap());
+}
+
+TEST(Image, FileURLsAreReadAndOtherSchemesRefused) {
+  std::string path = testing::fixturePath("images/sample.png");
+  std::string escaped = path;
+  for (std::size_t i = escaped.find('/', 1); i != std::string::npos; i = escaped.find('/', i + 3)) {
+    escaped.replace(i, 1, "%2F");
+  }
+  for (const std::string& url : {"file://" + path, "file:" + path, "FILE://localhost" + path,
+                                 "file:///" + escaped.substr(1)}) {
+    auto image = Image::initByReferencingURL(url);
+    EXPECT_TRUE(image->bitmap()) << url << ": " << image->failureReason();
+  }
+  struct Refused {
+    std::string url;
+    const char* reasonWord;
+  } refused[] = {{"https://example.com/a.png", "https"},
+                 {"file://otherhost" + path, "another host"},
+                 {"file://", "names no file"},
+                 {"no-scheme.png", "not a URL"}};
+  for (const auto& r : refused) {
+    auto image = Image::initByReferencingURL(r.url);
+    EXPECT_FALSE(image->bitmap()) << r.url;
+    EXPECT_NE(image->failureReason().find(r.reasonWord), std::string::npos)
+        << r.url << ": " << image->failureReason();
+  }
+}
+
+TEST(Image, JpegEncodingRoundTripsAndComposesAlphaOverWhite) {
+  constexpr std::uint32_t kSide = 32;
+  Data rgba(kSide * kSide * 4, 0);
+  for (std::size_t i = 0; i < rgba.size(); i += 4) {
+    rgba[i] = 10, rgba[i + 1] = 200, rgba[i + 2] = 30, rgba[i + 3] = 255;
+  }
+  for (std::size_t i = 0; i < kSide * 8 * 4; i += 4) rgba[i + 3] = 0;  // top 8 rows transparent
+  auto bitmap = Bitmap::fromRGBA(kSide, kSide, rgba.data(), rgba.size());
+  ASSERT_TRUE(bitmap);
+  auto image = Image::initWithBitmap(bitmap);
+  auto best = image->jpegData(1.0), worst = image->jpegData(0.0), odd = image->jpegData(-5);
+  ASSERT_TRUE(best && worst && odd);
+  EXPECT_EQ((*best)[0], 0xFF);
+  EXPECT_EQ((*best)[1], 0xD8);
+  EXPECT_EQ(*odd, *worst);  // out-of-range factors clamp
+  auto decoded = Image::initWithData(*best);
+  ASSERT_TRUE(decoded);
+  Data back = decoded->bitmap()->rgba();
+  EXPECT_NEAR(back[(2 * kSide + 5) * 4], 255, 8);  // transparent rows over white
+  const std::uint8_t* inner = &back[(24 * kSide + 12) * 4];
+  EXPECT_NEAR(inner[0], 10, 12);
+  EXPECT_NEAR(inner[1], 200, 12);
+  EXPECT_NEAR(inner[2], 30, 12);
+  EXPECT_FALSE(Bitmap::fromRGBA(0, kSide, rgba.data(), rgba.size()));
+  EXPECT_FALSE(Bitmap::fromRGBA(kSide, kSide + 1, rgba.data(), rgba.size()));  // too few bytes
+  EXPECT_FALSE(Image::initWithBitmap(nullptr));
+}
+
+}  // namespace
+}  // namespace corvel
