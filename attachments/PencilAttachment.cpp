@@ -2,7 +2,6 @@
 #include "Corvelbase/RVPencilAttachment.h"
 
 #include "Corvelbase/platform/Files.h"
-#include "attachments/PencilPaths.h"
 
 namespace corvel {
 
@@ -32,13 +31,13 @@ bool RVPencilAttachment::initWithDataHook(std::optional<Data> contentData,
 
 void RVPencilAttachment::createFileWrapper(const std::optional<Data>& strokeData) {
   if (!strokeData) return;
-  std::string uuid = makeUUIDString();
-  auto path = pencil::cachesPathFor(uuid + "." + RVPencilDataExtension);
-  if (!path) return;
-  uuid_ = std::move(uuid);
+  std::string directory = cachesDirectory();
+  if (directory.empty()) return;
+  uuid_ = makeUUIDString();
+  std::string path = directory + "/" + *uuid_ + "." + RVPencilDataExtension;
   // A failed write shows as a missing file below; the drawing then has no file to give.
-  writeFileAtomically(*path, *strokeData);
-  fw_ = FileWrapper::initWithPath(*path);
+  writeFileAtomically(path, *strokeData);
+  fw_ = FileWrapper::initWithPath(path);
 }
 
 std::optional<Data> RVPencilAttachment::strokeData() const {

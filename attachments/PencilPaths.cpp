@@ -1,7 +1,6 @@
 #include "attachments/PencilPaths.h"
 
 #include "Corvelbase/RVPencilAttachment.h"
-#include "Corvelbase/platform/Files.h"
 
 namespace corvel::pencil {
 
@@ -28,12 +27,6 @@ std::string identifierOfFileName(const std::string& path) {
 
 bool hasPencilDataExtension(const std::optional<std::string>& name) {
   return name && pathExtension(*name) == RVPencilDataExtension;
-}
-
-std::optional<std::string> cachesPathFor(const std::string& fileName) {
-  std::string directory = cachesDirectory();
-  if (directory.empty()) return std::nullopt;
-  return directory + "/" + fileName;
 }
 
 }  // namespace corvel::pencil

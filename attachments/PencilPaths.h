@@ -17,8 +17,5 @@ std::string pathExtension(const std::string& path);
 std::string identifierOfFileName(const std::string& path);
 // Whether `name` has the exact extension "pencildata" (case matters).
 bool hasPencilDataExtension(const std::optional<std::string>& name);
-// The path of `fileName` at the top of the caches directory, or nullopt when there is no
-// caches directory.
-std::optional<std::string> cachesPathFor(const std::string& fileName);
 
 }  // namespace corvel::pencil

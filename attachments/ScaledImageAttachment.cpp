@@ -4,7 +4,6 @@
 #include "Corvelbase/platform/Base64.h"
 #include "Corvelbase/platform/FileWrapper.h"
 #include "Corvelbase/platform/Files.h"
-#include "attachments/PencilPaths.h"
 
 namespace corvel {
 
@@ -45,20 +44,21 @@ void RVMXScaledImageAttachment::initScaledImage() { scaleImage_ = false; }
 
 void RVMXScaledImageAttachment::createFileWrapper(const std::optional<Data>& jpegData) {
   if (!jpegData) return;
-  if (cachesDirectory().empty()) return;
+  std::string directory = cachesDirectory();
+  if (directory.empty()) return;
   std::string identifier = pencilAttachment_ && pencilAttachment_->uuid()
                                ? *pencilAttachment_->uuid()
                                : makeUUIDString();
   std::string fileName = identifier + kJPEGExtension;
   // A drawing's uuid can be set by the host; one that is not a plain name would write
   // outside the caches directory, so it counts as a failed write.
-  auto path = isSafeFileName(fileName) ? pencil::cachesPathFor(fileName) : std::nullopt;
-  if (!path) {
+  if (!isSafeFileName(fileName)) {
     fw_ = nullptr;
     return;
   }
-  writeFileAtomically(*path, *jpegData);
-  fw_ = FileWrapper::initWithPath(*path);
+  std::string path = directory + "/" + fileName;
+  writeFileAtomically(path, *jpegData);
+  fw_ = FileWrapper::initWithPath(path);
 }
 
 Rect RVMXScaledImageAttachment::attachmentBoundsForTextContainer(const TextContainer*,
