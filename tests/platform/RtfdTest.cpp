@@ -203,6 +203,25 @@ TEST(Rtfd, AnOutsideReaderFindsTheText) {
     EXPECT_NE(result.output.find(wanted), std::string::npos) << wanted << "\n" << result.output;
 }
 
+TEST(Rtfd, TheToolPrintsTheTextOfBundlesAndFlatFiles) {
+  testing::TempDir dir;
+  Sample sample = sampleText();
+  ASSERT_TRUE(writeRTFDToPath(sample.text, dir.file("doc.rtfd")));
+  Data flat = RTFDFromRange(sample.text, Range{0, sample.text.length()});
+  ASSERT_TRUE(writeFileAtomically(dir.file("doc.flat"), flat));
+  std::string expected =
+      toUTF8(kTrickyText) + "[Attachment.png] | [notes.txt] | [notes.txt] | [Attachment.jpeg] | \n";
+  for (const char* name : {"doc.rtfd", "doc.flat"}) {
+    auto result = testing::runCommand(std::string(CORVEL_TOOL_PATH) + " rtfd " + dir.file(name));
+    EXPECT_EQ(result.status, 0) << name;
+    EXPECT_EQ(result.output, expected) << name;
+  }
+  EXPECT_EQ(testing::runCommand(std::string(CORVEL_TOOL_PATH) + " rtfd " + dir.file("none") +
+                                " 2>/dev/null")
+                .status,
+            1);
+}
+
 TEST(Rtfd, ReadsWhatTheDesktopEditorsWrite) {
   // The shape of a bundle's TXT.rtf as the platform's editors save it: a code page, a
   // font table, cocoa control words, a raw 8-bit placeholder and \'xx text.
