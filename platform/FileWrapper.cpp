@@ -17,6 +17,7 @@ struct FileWrapperAccess {
   static std::shared_ptr<FileWrapper> make() {
     return std::shared_ptr<FileWrapper>(new FileWrapper());
   }
+  static const Data& contents(const FileWrapper& w) { return w.contents_; }
 };
 
 namespace {
@@ -73,8 +74,9 @@ void putWord(Data& out, std::uint32_t v) {
 }
 
 // Appends the record of `w`; false when a file is too large for the 32-bit form.
-bool putRecord(Data& out, const FileWrapper& w, const Data& contents) {
+bool putRecord(Data& out, const FileWrapper& w) {
   if (w.isRegularFile()) {
+    const Data& contents = FileWrapperAccess::contents(w);
     if (contents.size() > 0xFFFFFFFFu) return false;
     putWord(out, kRecordFile);
     auto size = static_cast<std::uint32_t>(contents.size());
@@ -98,8 +100,7 @@ bool putRecord(Data& out, const FileWrapper& w, const Data& contents) {
   std::vector<Data> records;
   for (const auto& [name, child] : children) {
     Data record;
-    if (!putRecord(record, *child, child->isRegularFile() ? *child->regularFileContents() : Data{}))
-      return false;
+    if (!putRecord(record, *child)) return false;
     if (record.size() > 0xFFFFFFFFu) return false;
     putWord(out, static_cast<std::uint32_t>(record.size()));
     records.push_back(std::move(record));
@@ -271,7 +272,10 @@ bool FileWrapper::writeToPath(const std::string& path) const {
   fs::path parent = target.parent_path().empty() ? fs::path(".") : target.parent_path();
   std::string staging = (parent / ("." + target.filename().string() + ".XXXXXX")).string();
   if (!mkdtemp(staging.data())) return false;
-  bool ok = true;
+  // mkdtemp makes the directory private; give it what an ordinary mkdir would.
+  mode_t mask = umask(0);
+  umask(mask);
+  bool ok = chmod(staging.c_str(), 0777 & ~mask) == 0;
   for (const auto& [name, child] : children_)
     if (ok) ok = writeTree(*child, staging + "/" + name);
   if (ok) {
@@ -290,7 +294,7 @@ Data FileWrapper::serializedRepresentation() const {
   try {
     Data out(kMagic, kMagic + 4);
     putWord(out, 0);
-    if (!putRecord(out, *this, contents_)) return {};
+    if (!putRecord(out, *this)) return {};
     return out;
   } catch (const std::bad_alloc&) {
     return {};

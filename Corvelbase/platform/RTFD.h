@@ -70,7 +70,8 @@ CORVEL_EXPORT std::optional<AttributedString> attributedStringWithRTFDFileWrappe
 // The text of the flat form; nullopt when the bytes are not a serialised bundle.
 CORVEL_EXPORT std::optional<AttributedString> attributedStringWithRTFD(const Data& flat);
 // The text of the bundle directory at `path`, reading only TXT.rtf and the files it
-// names; nullopt when `path` is no directory (or a symbolic link) or has no TXT.rtf.
+// names; nullopt when `path` is no directory (a link to one will do) or has no regular
+// TXT.rtf.
 CORVEL_EXPORT std::optional<AttributedString> attributedStringWithContentsOfRTFD(
     const std::string& path);
 // The text of an RTF document alone: attachments come back without files. nullopt when

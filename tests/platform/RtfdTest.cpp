@@ -1,4 +1,5 @@
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <filesystem>
 #include <set>
@@ -99,6 +100,10 @@ TEST(Rtfd, BundleOnDiskRoundTripsTextAndFiles) {
   for (const auto& entry : fs::directory_iterator(path)) names.insert(entry.path().filename());
   EXPECT_EQ(names,
             (std::set<std::string>{"TXT.rtf", "Attachment.png", "notes.txt", "Attachment.jpeg"}));
+  // The bundle gets the permissions of an ordinary new directory, not a private one.
+  mode_t mask = umask(0);
+  umask(mask);
+  EXPECT_EQ(static_cast<mode_t>(fs::status(path).permissions()), 0777 & ~mask);
   auto read = attributedStringWithContentsOfRTFD(path);
   ASSERT_TRUE(read);
   expectSameDocument(*read, sample);
