@@ -28,12 +28,6 @@ class ScaledLike : public RVMXTextAttachment {
   }
 };
 
-class ScaledChild : public ScaledLike {
- public:
-  explicit ScaledChild(Passkey k) : ScaledLike(k) {}
-  static std::shared_ptr<ScaledChild> make() { return alloc<ScaledChild>(); }
-};
-
 std::shared_ptr<FileWrapper> wrapperNamed(const std::optional<std::string>& filename) {
   auto w = FileWrapper::initRegularFileWithContents(Data{1});
   w->setFilename(filename);
@@ -127,7 +121,6 @@ TEST(FileTypes, ClassTestsComeBeforeNameTests) {
   EXPECT_FALSE(preferredOnly->isPencilData());
 
   EXPECT_TRUE(ScaledLike::make()->isScaledImage());
-  EXPECT_TRUE(ScaledChild::make()->isScaledImage());
   EXPECT_FALSE(PencilLike::make()->isScaledImage());
   EXPECT_FALSE(RVMXTextAttachment::init()->isScaledImage());
   EXPECT_FALSE(TextAttachment::init()->isScaledImage());
