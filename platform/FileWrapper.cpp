@@ -254,7 +254,11 @@ std::string FileWrapper::addFileWrapper(std::shared_ptr<FileWrapper> child,
   auto dot = name.rfind('.');
   std::string stem = dot == std::string::npos || dot == 0 ? name : name.substr(0, dot);
   std::string extension = stem.size() == name.size() ? "" : name.substr(dot);
-  for (int n = 2; children_.count(unique); ++n) unique = stem + " " + std::to_string(n) + extension;
+  // Probing resumes where the last child asking for this name stopped, so adding many
+  // children under one name stays linear.
+  int& n = nextSuffix_[name];
+  if (n < 2) n = 2;
+  for (; children_.count(unique); ++n) unique = stem + " " + std::to_string(n) + extension;
   child->filename_ = unique;
   if (!child->preferredFilename_) child->preferredFilename_ = unique;
   children_.emplace(unique, std::move(child));

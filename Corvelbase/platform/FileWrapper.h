@@ -89,6 +89,7 @@ class CORVEL_EXPORT FileWrapper {
   Children children_;
   std::optional<std::string> filename_;
   std::optional<std::string> preferredFilename_;
+  std::map<std::string, int> nextSuffix_;  // per asked-for name, where uniquing goes on
 };
 
 // True for a name that can stand for one entry of a directory: not empty, not "." or
