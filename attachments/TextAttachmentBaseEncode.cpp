@@ -22,7 +22,7 @@ std::optional<Data> TextAttachment::encodedBase64Data() const {
   } else if (auto bytes = contents()) {
     data = std::move(bytes);  // any format, as it stands
   } else if (auto wrapper = fileWrapper()) {
-    auto fileBytes = wrapper->regularFileContents();
+    const auto& fileBytes = wrapper->regularFileContents();
     data = jpegDataForImage(fileBytes ? Image::initWithData(*fileBytes) : nullptr);
   }
   if (!data) return std::nullopt;

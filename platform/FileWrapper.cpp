@@ -72,12 +72,27 @@ void putWord(Data& out, std::uint32_t v) {
   for (int i = 0; i < 4; ++i) out.push_back(static_cast<std::uint8_t>(v >> (8 * i)));
 }
 
-// Appends the record of `w`; false when a file is too large for the 32-bit form.
-bool putRecord(Data& out, const FileWrapper& w, const Data& contents) {
-  if (w.isRegularFile()) {
-    if (contents.size() > 0xFFFFFFFFu) return false;
+// The size of the record of `w`; nullopt when a file or record is too large for the
+// 32-bit form.
+std::optional<std::uint64_t> recordSize(const FileWrapper& w) {
+  if (const auto& contents = w.regularFileContents()) {
+    if (contents->size() > 0xFFFFFFFFu) return std::nullopt;
+    return (contents->size() >= kLongLength ? 16 : 8) + contents->size();
+  }
+  std::uint64_t size = 8;
+  for (const auto& [name, child] : w.fileWrappers()) {
+    auto childSize = recordSize(*child);
+    if (!childSize || *childSize > 0xFFFFFFFFu) return std::nullopt;
+    size += 4 + name.size() + 4 + *childSize;
+  }
+  return size;
+}
+
+// Appends the record of `w`, whose size recordSize has vouched for.
+void putRecord(Data& out, const FileWrapper& w) {
+  if (const auto& contents = w.regularFileContents()) {
     putWord(out, kRecordFile);
-    auto size = static_cast<std::uint32_t>(contents.size());
+    auto size = static_cast<std::uint32_t>(contents->size());
     if (size >= kLongLength) {
       putWord(out, kLongLength);
       putWord(out, size);
@@ -85,8 +100,8 @@ bool putRecord(Data& out, const FileWrapper& w, const Data& contents) {
     } else {
       putWord(out, size);
     }
-    out.insert(out.end(), contents.begin(), contents.end());
-    return true;
+    out.insert(out.end(), contents->begin(), contents->end());
+    return;
   }
   const auto& children = w.fileWrappers();
   putWord(out, kRecordDirectory);
@@ -95,17 +110,9 @@ bool putRecord(Data& out, const FileWrapper& w, const Data& contents) {
     putWord(out, static_cast<std::uint32_t>(name.size()));
     out.insert(out.end(), name.begin(), name.end());
   }
-  std::vector<Data> records;
-  for (const auto& [name, child] : children) {
-    Data record;
-    if (!putRecord(record, *child, child->isRegularFile() ? *child->regularFileContents() : Data{}))
-      return false;
-    if (record.size() > 0xFFFFFFFFu) return false;
-    putWord(out, static_cast<std::uint32_t>(record.size()));
-    records.push_back(std::move(record));
-  }
-  for (const auto& record : records) out.insert(out.end(), record.begin(), record.end());
-  return true;
+  for (const auto& [name, child] : children)
+    putWord(out, static_cast<std::uint32_t>(*recordSize(*child)));
+  for (const auto& [name, child] : children) putRecord(out, *child);
 }
 
 // A bounds-checked reader over a byte span.
@@ -182,7 +189,7 @@ std::shared_ptr<FileWrapper> readRecord(Reader& in, int depth) {
 }
 
 bool writeTree(const FileWrapper& w, const std::string& path) {
-  if (w.isRegularFile()) return writeFileAtomically(path, *w.regularFileContents());
+  if (const auto& contents = w.regularFileContents()) return writeFileAtomically(path, *contents);
   if (mkdir(path.c_str(), 0777) != 0) return false;
   for (const auto& [name, child] : w.fileWrappers())
     if (!writeTree(*child, path + "/" + name)) return false;
@@ -212,7 +219,7 @@ std::shared_ptr<FileWrapper> FileWrapper::initRegularFileWithContents(Data conte
 
 std::shared_ptr<FileWrapper> FileWrapper::initDirectoryWithFileWrappers(const Children& children) {
   auto w = FileWrapperAccess::make();
-  w->isDirectory_ = true;
+  w->contents_.reset();
   for (const auto& [name, child] : children) {
     if (!child || !isSafeFileName(name)) continue;
     child->filename_ = name;
@@ -235,11 +242,6 @@ std::shared_ptr<FileWrapper> FileWrapper::initWithSerializedRepresentation(const
   }
 }
 
-std::optional<Data> FileWrapper::regularFileContents() const {
-  if (isDirectory_) return std::nullopt;
-  return contents_;
-}
-
 std::string FileWrapper::addFileWrapper(std::shared_ptr<FileWrapper> child) {
   if (!child) return {};
   std::string name = child->preferredFilename().value_or(child->filename().value_or(""));
@@ -248,12 +250,16 @@ std::string FileWrapper::addFileWrapper(std::shared_ptr<FileWrapper> child) {
 
 std::string FileWrapper::addFileWrapper(std::shared_ptr<FileWrapper> child,
                                         const std::string& name) {
-  if (!isDirectory_ || !child || !isSafeFileName(name)) return {};
+  if (!isDirectory() || !child || !isSafeFileName(name)) return {};
   std::string unique = name;
   auto dot = name.rfind('.');
   std::string stem = dot == std::string::npos || dot == 0 ? name : name.substr(0, dot);
   std::string extension = stem.size() == name.size() ? "" : name.substr(dot);
-  for (int n = 2; children_.count(unique); ++n) unique = stem + " " + std::to_string(n) + extension;
+  // Probing resumes where the last child asking for this name stopped, so adding many
+  // children under one name stays linear.
+  int& n = nextSuffix_[name];
+  if (n < 2) n = 2;
+  for (; children_.count(unique); ++n) unique = stem + " " + std::to_string(n) + extension;
   child->filename_ = unique;
   if (!child->preferredFilename_) child->preferredFilename_ = unique;
   children_.emplace(unique, std::move(child));
@@ -263,7 +269,7 @@ std::string FileWrapper::addFileWrapper(std::shared_ptr<FileWrapper> child,
 bool FileWrapper::removeFileWrapper(const std::string& name) { return children_.erase(name) > 0; }
 
 bool FileWrapper::writeToPath(const std::string& path) const {
-  if (isRegularFile()) return writeFileAtomically(path, contents_);
+  if (contents_) return writeFileAtomically(path, *contents_);
   namespace fs = std::filesystem;
   std::error_code ec;
   fs::path target(path);
@@ -271,7 +277,10 @@ bool FileWrapper::writeToPath(const std::string& path) const {
   fs::path parent = target.parent_path().empty() ? fs::path(".") : target.parent_path();
   std::string staging = (parent / ("." + target.filename().string() + ".XXXXXX")).string();
   if (!mkdtemp(staging.data())) return false;
-  bool ok = true;
+  // mkdtemp makes the directory private; give it what an ordinary mkdir would.
+  mode_t mask = umask(0);
+  umask(mask);
+  bool ok = chmod(staging.c_str(), 0777 & ~mask) == 0;
   for (const auto& [name, child] : children_)
     if (ok) ok = writeTree(*child, staging + "/" + name);
   if (ok) {
@@ -288,9 +297,13 @@ bool FileWrapper::writeToPath(const std::string& path) const {
 
 Data FileWrapper::serializedRepresentation() const {
   try {
-    Data out(kMagic, kMagic + 4);
+    auto size = recordSize(*this);
+    if (!size) return {};
+    Data out;
+    out.reserve(8 + *size);
+    for (char c : kMagic) out.push_back(static_cast<std::uint8_t>(c));
     putWord(out, 0);
-    if (!putRecord(out, *this, contents_)) return {};
+    putRecord(out, *this);
     return out;
   } catch (const std::bad_alloc&) {
     return {};

@@ -77,11 +77,12 @@ class CORVEL_EXPORT AttributedString {
   // them. Past the end: empty, NotFoundRange.
   Attributes attributesAtIndex(std::uint64_t index, Range* effectiveRange) const;
   // The same, with the longest range of equal attributes around `index` within
-  // `rangeLimit`.
+  // `rangeLimit` (clamped to the text); {index, 0} when `index` lies outside the limit.
   Attributes attributesAtIndex(std::uint64_t index, Range* longestEffectiveRange,
                                Range rangeLimit) const;
   // The value of one attribute at `index` (nullopt when absent), and in
-  // `effectiveRange` the range over which that value holds (absence included).
+  // `effectiveRange` the longest range over which that value holds (absence included);
+  // the second form looks only within `rangeLimit`, as above.
   std::optional<AttributeValue> attribute(const std::string& name, std::uint64_t index,
                                           Range* effectiveRange) const;
   std::optional<AttributeValue> attribute(const std::string& name, std::uint64_t index,

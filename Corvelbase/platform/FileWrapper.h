@@ -44,8 +44,8 @@ class CORVEL_EXPORT FileWrapper {
   FileWrapper(const FileWrapper&) = delete;
   FileWrapper& operator=(const FileWrapper&) = delete;
 
-  bool isRegularFile() const { return !isDirectory_; }
-  bool isDirectory() const { return isDirectory_; }
+  bool isRegularFile() const { return contents_.has_value(); }
+  bool isDirectory() const { return !contents_.has_value(); }
 
   const std::optional<std::string>& filename() const { return filename_; }
   void setFilename(std::optional<std::string> name) { filename_ = std::move(name); }
@@ -54,8 +54,9 @@ class CORVEL_EXPORT FileWrapper {
     preferredFilename_ = std::move(name);
   }
 
-  // The bytes of a regular file; nullopt for a directory.
-  std::optional<Data> regularFileContents() const;
+  // The bytes of a regular file (a reference, valid while the wrapper lives); nullopt for
+  // a directory.
+  const std::optional<Data>& regularFileContents() const { return contents_; }
   // The children of a directory by name; empty for a regular file.
   const Children& fileWrappers() const { return children_; }
 
@@ -84,11 +85,11 @@ class CORVEL_EXPORT FileWrapper {
   FileWrapper() = default;
   friend struct FileWrapperAccess;
 
-  bool isDirectory_ = false;
-  Data contents_;
+  std::optional<Data> contents_;  // nullopt for a directory
   Children children_;
   std::optional<std::string> filename_;
   std::optional<std::string> preferredFilename_;
+  std::map<std::string, int> nextSuffix_;  // per asked-for name, where uniquing goes on
 };
 
 // True for a name that can stand for one entry of a directory: not empty, not "." or

@@ -22,7 +22,23 @@
 // with bounds from \width and \height. File names inside the RTF are untrusted: a name
 // that is not one safe path component, or names a missing file, a symbolic link or a
 // special file, gives an attachment without a file wrapper or contents; nothing outside
-// the bundle is ever read. See platform/rtfd/RtfCodec.h for what the RTF reader accepts.
+// the bundle is ever read.
+//
+// What the RTF reader accepts: groups; \uN with \ucN fallbacks (negative N, and surrogate
+// halves that pair up); \'xx in the document's code page (\ansicpgN, \ansi, \mac, \pc,
+// \pca, decoded with ICU; Windows-1252 when unknown); raw 8-bit text in that code page;
+// \par, \sect, \row (line feed), \line (U+2028), \tab and \cell (tab), \page (form feed),
+// the symbols \~ \_ \- \\ \{ \} and \emdash, \endash, \lquote, \rquote, \ldblquote,
+// \rdblquote, \bullet, \enspace, \emspace, \qmspace, \zwj, \zwnj, \ltrmark, \rtlmark;
+// \bin N (its bytes skipped); \NeXTGraphic with \width and \height.
+// What it ignores: every other control word (fonts, sizes, colours, paragraph and
+// character formatting, document settings), per-font \fcharset code pages, the
+// destinations \fonttbl, \colortbl, \stylesheet, \info, \pict, \object, headers,
+// footers, footnotes, \fldinst, list tables, \listtext and every {\* ...} group.
+// Hostile input: any byte string gives an answer in time linear in its size; control
+// words and numbers of any length are skipped, nesting deeper than 4096 groups keeps the
+// innermost kept state, text after the group that closes the document is ignored, and a
+// truncated document yields what was read (an unfinished \NeXTGraphic is dropped).
 #pragma once
 
 #include <memory>
@@ -54,7 +70,8 @@ CORVEL_EXPORT std::optional<AttributedString> attributedStringWithRTFDFileWrappe
 // The text of the flat form; nullopt when the bytes are not a serialised bundle.
 CORVEL_EXPORT std::optional<AttributedString> attributedStringWithRTFD(const Data& flat);
 // The text of the bundle directory at `path`, reading only TXT.rtf and the files it
-// names; nullopt when `path` is no directory (or a symbolic link) or has no TXT.rtf.
+// names; nullopt when `path` is no directory (a link to one will do) or has no regular
+// TXT.rtf.
 CORVEL_EXPORT std::optional<AttributedString> attributedStringWithContentsOfRTFD(
     const std::string& path);
 // The text of an RTF document alone: attachments come back without files. nullopt when

@@ -8,21 +8,7 @@
 // in twips. The reader turns that construct back into one U+FFFC carrying the attachment
 // that a resolver makes for NAME.
 //
-// What the reader understands: groups; \uN with \ucN fallbacks (negative N, and surrogate
-// halves that pair up); \'xx in the document's code page (\ansicpgN, \ansi, \mac, \pc,
-// \pca, decoded with ICU; Windows-1252 when unknown); raw 8-bit text in that code page;
-// \par, \sect, \row (line feed), \line (U+2028), \tab and \cell (tab), \page (form feed),
-// the symbols \~ \_ \- \\ \{ \} and \emdash, \endash, \lquote, \rquote, \ldblquote,
-// \rdblquote, \bullet, \enspace, \emspace, \qmspace, \zwj, \zwnj, \ltrmark, \rtlmark;
-// \bin N (its bytes skipped); \NeXTGraphic with \width and \height.
-// What it ignores: every other control word (fonts, sizes, colours, paragraph and
-// character formatting, document settings), per-font \fcharset code pages, the
-// destinations \fonttbl, \colortbl, \stylesheet, \info, \pict, \object, headers,
-// footers, footnotes, \fldinst, list tables, \listtext and every {\* ...} group.
-// Hostile input: any byte string gives an answer in time linear in its size; control
-// words and numbers of any length are skipped, nesting deeper than 4096 groups keeps the
-// innermost kept state, text after the group that closes the document is ignored, and a
-// truncated document yields what was read (an unfinished \NeXTGraphic is dropped).
+// What the reader accepts and ignores is listed in Corvelbase/platform/RTFD.h.
 #pragma once
 
 #include <cstdint>

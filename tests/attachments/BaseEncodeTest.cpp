@@ -1,0 +1,127 @@
+#include <gtest/gtest.h>
+
+#include <random>
+
+#include "Corvelbase/RVMXTextAttachment.h"
+#include "Corvelbase/platform/Base64.h"
+#include "Corvelbase/platform/Files.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+Data fixture(const std::string& name) {
+  return readFile(testing::fixturePath("images/" + name)).value_or(Data{});
+}
+
+std::string text(const Data& d) { return std::string(d.begin(), d.end()); }
+
+bool isJPEG(const Data& d) { return d.size() > 3 && d[0] == 0xFF && d[1] == 0xD8 && d[2] == 0xFF; }
+
+TEST(Base64, LinesOf64EndWithCarriageReturnLineFeed) {
+  std::mt19937 random(42);
+  testing::TempDir dir;
+  // Around the line length (48 bytes make exactly one line) and a long text.
+  for (std::size_t size : {0, 1, 47, 48, 49, 96, 97, 1000}) {
+    Data bytes(size);
+    for (auto& b : bytes) b = static_cast<std::uint8_t>(random());
+    std::string encoded = text(encodedBase64Data(bytes));
+    // coreutils' base64 wraps with LF; with CR LF instead it must give the same text,
+    // without a break after the last line.
+    ASSERT_TRUE(writeFileAtomically(dir.file("in"), bytes));
+    auto reference = testing::runCommand("base64 -w 64 " + dir.file("in"));
+    ASSERT_EQ(reference.status, 0);
+    std::string expected;
+    for (char ch : reference.output) expected += ch == '\n' ? "\r\n" : std::string(1, ch);
+    if (!expected.empty()) expected.resize(expected.size() - 2);
+    EXPECT_EQ(encoded, expected) << size << " bytes";
+    EXPECT_EQ(base64Decoding(encoded), bytes);
+  }
+  EXPECT_EQ(base64Encoding(Data(49, 0),
+                           Base64Encoding64CharacterLineLength | Base64EncodingEndLineWithLineFeed)
+                .find('\r'),
+            std::string::npos);
+  for (const char* bad : {"A", "AB=C", "A===", "AB*D", "AA==AA=="})
+    EXPECT_FALSE(base64Decoding(bad)) << bad;
+}
+
+TEST(BaseEncode, Base64ChoosesImageThenContentsThenFile) {
+  Data png = fixture("sample.png");
+  auto picture = Image::initWithData(fixture("sample.gif"));
+  auto pngFile = FileWrapper::initRegularFileWithContents(png);
+  enum Source { kJPEGOfImage, kContentsAsTheyAre, kJPEGOfFile, kNothing };
+  struct Case {
+    const char* name;
+    std::shared_ptr<Image> image;
+    std::optional<Data> contents;
+    std::shared_ptr<FileWrapper> wrapper;
+    Source source;
+  } cases[] = {
+      {"image over contents and file", picture, png, pngFile, kJPEGOfImage},
+      {"png contents are not re-encoded", nullptr, png, pngFile, kContentsAsTheyAre},
+      {"any contents at all", nullptr, Data{'%', 'P', 'D', 'F'}, nullptr, kContentsAsTheyAre},
+      {"empty contents", nullptr, Data{}, pngFile, kContentsAsTheyAre},
+      {"file decoded and re-encoded", nullptr, std::nullopt, pngFile, kJPEGOfFile},
+      {"file that is no image", nullptr, std::nullopt,
+       FileWrapper::initRegularFileWithContents(Data{1, 2, 3}), kNothing},
+      {"directory file", nullptr, std::nullopt, FileWrapper::initDirectoryWithFileWrappers({}),
+       kNothing},
+      // An image that cannot be written ends the search: contents are not tried.
+      {"undecodable image", Image::initByReferencingFile("/nonexistent/x.png"), png, nullptr,
+       kNothing},
+      {"nothing", nullptr, std::nullopt, nullptr, kNothing},
+  };
+  for (const auto& c : cases) {
+    auto a = TextAttachment::initWithData(c.contents, "public.png");
+    a->setImage(c.image);
+    a->setFileWrapper(c.wrapper);
+    auto encoded = a->encodedBase64Data();
+    if (c.source == kNothing) {
+      EXPECT_FALSE(encoded) << c.name;
+      continue;
+    }
+    ASSERT_TRUE(encoded) << c.name;
+    auto decoded = base64Decoding(text(*encoded));
+    ASSERT_TRUE(decoded) << c.name;
+    if (c.source == kContentsAsTheyAre) {
+      EXPECT_EQ(*decoded, *c.contents) << c.name;
+      continue;
+    }
+    EXPECT_TRUE(isJPEG(*decoded)) << c.name;
+    auto back = Image::initWithData(*decoded);
+    ASSERT_TRUE(back) << c.name;
+    EXPECT_EQ(back->size(), (Size{24, 16})) << c.name;
+  }
+}
+
+// An attachment whose picture and contents depend on its state, as the library's own
+// subclasses do: encoding must see the overrides.
+class ExportingPicture : public RVMXTextAttachment {
+ public:
+  explicit ExportingPicture(Passkey k) : RVMXTextAttachment(k) {}
+  static std::shared_ptr<ExportingPicture> make() { return alloc<ExportingPicture>(); }
+  std::shared_ptr<Image> image() const override {
+    return saving() == kSavingTextExport ? nullptr : RVMXTextAttachment::image();
+  }
+  std::optional<Data> contents() const override { return Data{'o', 'k'}; }
+};
+
+TEST(BaseEncode, EncodingReadsThroughTheSubclassOverrides) {
+  auto a = ExportingPicture::make();
+  a->setImage(Image::initWithData(fixture("sample.png")));
+  auto asPicture = base64Decoding(text(*a->encodedBase64Data()));
+  ASSERT_TRUE(asPicture);
+  EXPECT_TRUE(isJPEG(*asPicture));
+  a->setSaving(kSavingTextExport);
+  EXPECT_EQ(text(*a->encodedBase64Data()), "b2s=");
+
+  // JPEG at 0.9: below the best quality, from the same pixels.
+  auto photo = Image::initWithData(fixture("sample.jpg"));
+  auto atNine = a->jpegDataForImage(photo);
+  ASSERT_TRUE(atNine && isJPEG(*atNine));
+  EXPECT_LT(atNine->size(), photo->jpegData(1.0)->size());
+  EXPECT_FALSE(a->jpegDataForImage(nullptr));
+}
+
+}  // namespace
+}  // namespace corvel
