@@ -1,0 +1,248 @@
+#include <gtest/gtest.h>
+
+#include <sys/stat.h>
+
+#include <fstream>
+#include <thread>
+
+#include "Corvelbase/platform/PropertyList.h"
+#include "Corvelbase/platform/TypeRegistry.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+struct ConformanceCase {
+  const char* type;
+  const char* parent;
+  bool conforms;
+};
+
+TEST(TypeRegistry, ConformanceFollowsTheDeclaredHierarchy) {
+  const ConformanceCase cases[] = {
+      // Reflexive, and case never matters.
+      {"public.jpeg", "public.jpeg", true},
+      {"PUBLIC.JPEG", "public.Image", true},
+      // Transitive through several levels.
+      {"public.utf8-plain-text", "public.text", true},
+      {"public.utf8-plain-text", "public.content", true},
+      {"public.utf8-plain-text", "public.item", true},
+      {"public.video", "public.audiovisual-content", true},
+      {"public.heic", "public.image", true},
+      {"com.apple.m4a-audio", "public.audio", true},
+      {"org.textbundle.compressed", "public.archive", true},
+      {"public.zip-archive", "public.data", true},
+      {"com.apple.mail.email", "public.message", true},
+      {"com.apple.web-internet-location", "public.data", true},
+      {"net.daringfireball.markdown", "public.plain-text", true},
+      {"public.file-url", "public.url", true},
+      // Packages are directories, not data.
+      {"com.apple.rtfd", "com.apple.package", true},
+      {"com.apple.rtfd", "public.composite-content", true},
+      {"com.apple.rtfd", "public.data", false},
+      {"org.textbundle.package", "public.directory", true},
+      {"org.textbundle.package", "public.text", false},
+      {"com.apple.flat-rtfd", "public.data", true},
+      {"com.adobe.pdf", "public.content", true},
+      {"com.adobe.pdf", "public.text", false},
+      // Never upwards, never sideways.
+      {"public.text", "public.plain-text", false},
+      {"public.image", "public.jpeg", false},
+      {"public.rtf", "com.apple.rtfd", false},
+      {"public.png", "public.text", false},
+      {"public.archive", "public.data", false},
+      {"public.message", "public.data", false},
+      // Unknown identifiers conform to themselves only; dynamic ones also to data and item.
+      {"com.example.unknown", "com.example.unknown", true},
+      {"com.example.unknown", "public.item", false},
+      {"dyn.ah62d4rv4ge81g6pq", "public.data", true},
+      {"dyn.ah62d4rv4ge81g6pq", "public.item", true},
+      {"dyn.ah62d4rv4ge81g6pq", "public.text", false},
+      {"", "public.item", false},
+  };
+  TypeRegistry& types = TypeRegistry::shared();
+  for (const ConformanceCase& c : cases)
+    EXPECT_EQ(types.conformsTo(c.type, c.parent), c.conforms) << c.type << " -> " << c.parent;
+}
+
+TEST(TypeRegistry, EqualityIgnoresCaseOnly) {
+  TypeRegistry& types = TypeRegistry::shared();
+  EXPECT_TRUE(types.equal("public.RTF", "PUBLIC.rtf"));
+  EXPECT_FALSE(types.equal("public.rtf", "public.rtf "));
+  EXPECT_FALSE(types.equal("public.rtf", "com.apple.rtfd"));
+  // Equality is not conformance.
+  EXPECT_FALSE(types.equal("public.jpeg", "public.image"));
+}
+
+struct TagCase {
+  const char* tag;
+  const char* type;
+};
+
+TEST(TypeRegistry, FilenameExtensionsAndMIMETypesFindTheirTypes) {
+  const TagCase extensions[] = {
+      {"txt", "public.plain-text"},
+      {"JPG", "public.jpeg"},
+      {"jpe", "public.jpeg"},
+      {"Tif", "public.tiff"},
+      {"htm", "public.html"},
+      {"md", "net.daringfireball.markdown"},
+      {"rtfd", "com.apple.rtfd"},
+      {"textbundle", "org.textbundle.package"},
+      {"textpack", "org.textbundle.compressed"},
+      {"zip", "public.zip-archive"},
+      {"gz", "org.gnu.gnu-zip-archive"},
+      {"m4a", "com.apple.m4a-audio"},
+      {"heic", "public.heic"},
+      {"webp", "org.webmproject.webp"},
+      {"webloc", "com.apple.web-internet-location"},
+      {"eml", "public.email-message"},
+      {"emlx", "com.apple.mail.email"},
+      {"vcf", "public.vcard"},
+      {"pdf", "com.adobe.pdf"},
+      {"mov", "com.apple.quicktime-movie"},
+  };
+  TypeRegistry& types = TypeRegistry::shared();
+  for (const TagCase& c : extensions)
+    EXPECT_EQ(types.typeForFilenameExtension(c.tag), c.type) << c.tag;
+
+  const TagCase mimes[] = {
+      {"image/png", "public.png"},
+      {"TEXT/HTML; charset=utf-8", "public.html"},
+      {"message/rfc822", "public.email-message"},
+      {"audio/mp4", "public.mpeg-4-audio"},
+      {"application/octet-stream", "public.data"},
+  };
+  for (const TagCase& c : mimes) EXPECT_EQ(types.typeForMIMEType(c.tag), c.type) << c.tag;
+  EXPECT_EQ(types.preferredFilenameExtension("public.jpeg"), "jpeg");
+  EXPECT_EQ(types.preferredMIMEType("public.plain-text"), "text/plain");
+  EXPECT_EQ(types.preferredFilenameExtension("public.text"), std::nullopt);
+}
+
+TEST(TypeRegistry, UnclaimedTagsGetDynamicIdentifiersThatRoundTrip) {
+  TypeRegistry& types = TypeRegistry::shared();
+  // The platform's own identifier for the extension "sql".
+  EXPECT_EQ(types.typeForFilenameExtension("sql"), "dyn.ah62d4rv4ge81g6pq");
+  EXPECT_EQ(types.typeForFilenameExtension("SQL"), "dyn.ah62d4rv4ge81g6pq");
+  for (const char* tag : {"sql", "x", "a:b=c\\d", "", "долгое"}) {
+    std::string dyn = types.typeForFilenameExtension(tag);
+    EXPECT_TRUE(TypeRegistry::isDynamic(dyn)) << tag;
+    EXPECT_EQ(types.preferredFilenameExtension(dyn), tag) << dyn;
+    EXPECT_TRUE(types.conformsTo(dyn, "public.data"));
+  }
+  std::string mime = types.typeForMIMEType("application/x-corvel-test");
+  EXPECT_EQ(types.preferredMIMEType(mime), "application/x-corvel-test");
+  EXPECT_NE(mime, types.typeForFilenameExtension("application/x-corvel-test"));
+  // Not base-32 of our alphabet: no tag, no crash.
+  EXPECT_EQ(types.preferredFilenameExtension("dyn.a!!"), std::nullopt);
+  EXPECT_EQ(types.preferredFilenameExtension("dyn.aiii"), std::nullopt);
+  EXPECT_FALSE(TypeRegistry::isDynamic("DYN.ah62d4rv4ge81g6pq"));
+}
+
+TEST(TypeRegistry, SupertypesListEachAncestorOnceNearestFirst) {
+  TypeRegistry& types = TypeRegistry::shared();
+  EXPECT_EQ(types.supertypes("public.utf8-plain-text"),
+            (std::vector<std::string>{"public.utf8-plain-text", "public.plain-text", "public.text",
+                                      "public.data", "public.content", "public.item"}));
+  EXPECT_EQ(types.supertypes("com.example.nothing"),
+            (std::vector<std::string>{"com.example.nothing"}));
+  EXPECT_EQ(types.supertypes("dyn.ah62d4rv4ge81g6pq"),
+            (std::vector<std::string>{"dyn.ah62d4rv4ge81g6pq", "public.data", "public.item"}));
+}
+
+TEST(TypeRegistry, HostDeclarationsJoinTheHierarchyWithoutStealingTags) {
+  TypeRegistry types;  // private: leaves the shared registry alone
+  EXPECT_FALSE(types.declare(TypeDeclaration{}));
+  ASSERT_TRUE(types.declare({"com.example.notes",
+                             {"net.daringfireball.markdown"},
+                             {"note", "md"},
+                             {"text/x-note"},
+                             "notes"}));
+  EXPECT_TRUE(types.conformsTo("COM.EXAMPLE.NOTES", "public.text"));
+  EXPECT_EQ(types.typeForFilenameExtension("NOTE"), "com.example.notes");
+  EXPECT_EQ(types.typeForFilenameExtension("md"), "net.daringfireball.markdown");
+  // Declarations that loop back on themselves still answer.
+  types.declare({"com.example.a", {"com.example.b"}, {}, {}, ""});
+  types.declare({"com.example.b", {"com.example.a", "public.image"}, {}, {}, ""});
+  EXPECT_TRUE(types.conformsTo("com.example.a", "public.data"));
+  EXPECT_FALSE(types.conformsTo("com.example.a", "public.text"));
+  // Redeclaring replaces: the old tag is released.
+  types.declare({"com.example.notes", {"public.data"}, {"note2"}, {}, ""});
+  EXPECT_TRUE(TypeRegistry::isDynamic(types.typeForFilenameExtension("note")));
+  EXPECT_FALSE(types.conformsTo("com.example.notes", "public.text"));
+  EXPECT_FALSE(TypeRegistry::shared().isDeclared("com.example.notes"));
+}
+
+TEST(TypeRegistry, LoadsDeclarationsFromAPropertyListFile) {
+  testing::TempDir dir;
+  using D = PropertyList::Dictionary;
+  using A = PropertyList::Array;
+  PropertyList info(D{
+      {"UTExportedTypeDeclarations",
+       A{D{{"UTTypeIdentifier", u"com.example.board"},
+           {"UTTypeConformsTo", A{u"public.data", u"public.composite-content"}},
+           {"UTTypeTagSpecification", D{{"public.filename-extension", u"board"},
+                                        {"public.mime-type", A{u"application/x-board"}}}}},
+         D{{"UTTypeConformsTo", u"public.data"}},  // no identifier: skipped
+         PropertyList(u"not a dictionary")}},
+  });
+  ASSERT_TRUE(info.writeToFile(dir.file("Info.plist"), PropertyList::Format::Binary));
+  TypeRegistry types;
+  EXPECT_EQ(types.loadDeclarations(dir.file("Info.plist")), 1u);
+  EXPECT_EQ(types.typeForFilenameExtension("board"), "com.example.board");
+  EXPECT_EQ(types.typeForMIMEType("application/x-board"), "com.example.board");
+  EXPECT_TRUE(types.conformsTo("com.example.board", "public.content"));
+
+  std::ofstream(dir.file("junk.plist")) << "not a property list";
+  EXPECT_EQ(types.loadDeclarations(dir.file("junk.plist")), std::nullopt);
+  EXPECT_EQ(types.loadDeclarations(dir.file("missing.plist")), std::nullopt);
+  ASSERT_TRUE(PropertyList(D{{"CFBundleName", u"x"}})
+                  .writeToFile(dir.file("other.plist"), PropertyList::Format::XML));
+  EXPECT_EQ(types.loadDeclarations(dir.file("other.plist")), std::nullopt);
+}
+
+TEST(TypeOfFile, NamesFilesByExtensionAndDirectoriesByKind) {
+  testing::TempDir dir;
+  for (const char* name : {"a.PNG", "notes.md", "README", ".hidden", "x.sql", "trail."})
+    std::ofstream(dir.file(name)) << "x";
+  for (const char* name : {"Doc.rtfd", "Doc.textbundle", "plain", "photos.png"})
+    ASSERT_EQ(::mkdir(dir.file(name).c_str(), 0755), 0);
+  const TagCase cases[] = {
+      {"a.PNG", "public.png"},
+      {"notes.md", "net.daringfireball.markdown"},
+      {"README", "public.data"},
+      {".hidden", "public.data"},
+      {"trail.", "public.data"},
+      {"x.sql", "dyn.ah62d4rv4ge81g6pq"},
+      {"Doc.rtfd", "com.apple.rtfd"},
+      {"Doc.rtfd/", "com.apple.rtfd"},
+      {"Doc.textbundle", "org.textbundle.package"},
+      {"plain", "public.folder"},
+      {"photos.png", "public.folder"},  // only package extensions name a directory
+  };
+  for (const TagCase& c : cases) EXPECT_EQ(typeOfFile(dir.file(c.tag)), c.type) << c.tag;
+  EXPECT_EQ(typeOfFile(dir.file("missing.txt")), std::nullopt);
+  EXPECT_EQ(typeOfFile(""), std::nullopt);
+}
+
+TEST(TypeRegistry, AnswersWhileAnotherThreadDeclares) {
+  TypeRegistry types;
+  std::thread writer([&] {
+    for (int i = 0; i < 200; ++i)
+      types.declare({"com.example.t" + std::to_string(i),
+                     {"public.text"},
+                     {"t" + std::to_string(i)},
+                     {},
+                     ""});
+  });
+  for (int i = 0; i < 2000; ++i) {
+    ASSERT_TRUE(types.conformsTo("public.jpeg", "public.data"));
+    ASSERT_FALSE(types.conformsTo("public.jpeg", "public.text"));
+  }
+  writer.join();
+  EXPECT_TRUE(types.conformsTo("com.example.t199", "public.item"));
+  EXPECT_EQ(types.typeForFilenameExtension("t150"), "com.example.t150");
+}
+
+}  // namespace
+}  // namespace corvel

@@ -1,0 +1,101 @@
+#include <gtest/gtest.h>
+
+#include <chrono>
+
+#include "Corvelbase/Email.h"
+
+namespace corvel {
+namespace {
+
+using Email::headerValueForField;
+
+const String kMessage =
+    u"Return-Path: <bounce@lists.example.org>\r\n"
+    u"From: Ada Lovelace <ada@example.com>\r\n"
+    u"To: charles.babbage@example.com, ada@example.com\r\n"
+    u"Cc:\tJane <jane@example.net>\r\n"
+    u"Subject: Hello\r\n"
+    u"X-Note:NoSpace\r\n"
+    u"X-Spam-Flag: YES\r\n"
+    u"Thread-Topic: first line\r\n"
+    u"  folded second line\r\n"
+    u"Reply-To: a.b.c@example.com,\r\n"
+    u"Date:  Mon, 2 Jan 2023 10:00:00 +0000\r\n"
+    u"\r\n"
+    u"Body text. Subject: not a header because it does not start a line\n";
+
+struct Case {
+  const char16_t* field;
+  bool extract;
+  std::optional<std::u16string> expected;
+};
+
+TEST(HeaderValue, ReadsTheRestOfTheFirstMatchingLine) {
+  const Case cases[] = {
+      // Field names match in any case; the value is the rest of the line.
+      {u"subject", false, u"Hello"},
+      {u"SUBJECT", false, u"Hello"},
+      {u"From", false, u"Ada Lovelace <ada@example.com>"},
+      {u"Cc", false, u"Jane <jane@example.net>"},  // a tab is white space too
+      // Exactly one white-space character is eaten: a second one is part of the value.
+      {u"Date", false, u" Mon, 2 Jan 2023 10:00:00 +0000"},
+      // No white space after the colon: no value.
+      {u"X-Note", false, std::nullopt},
+      // Folded lines are not joined.
+      {u"Thread-Topic", false, u"first line"},
+      // The name must start a line and be followed by the colon.
+      {u"Topic", false, std::nullopt},
+      {u"Sub", false, std::nullopt},
+      {u"Missing", false, std::nullopt},
+      // The field is a pattern: its metacharacters keep their meaning.
+      {u"X-Spam-.*", false, u"YES"},
+      {u"Su.ject", false, u"Hello"},
+      {u"(?:To|Cc)", false, u"charles.babbage@example.com, ada@example.com"},
+      // Patterns that do not compile, or bring groups of their own: no value, no crash.
+      {u"Subject(", false, std::nullopt},
+      {u"[", false, std::nullopt},
+      {u"\\", false, std::nullopt},
+      {u"(Subject)", false, std::nullopt},
+      {u"", false, std::nullopt},
+  };
+  for (const Case& c : cases)
+    EXPECT_EQ(headerValueForField(kMessage, c.field, c.extract), c.expected) << toUTF8(c.field);
+}
+
+TEST(HeaderValue, ExtractsTheAddressAsThePatternFindsIt) {
+  const Case cases[] = {
+      {u"From", true, u"ada@example.com"},
+      {u"Return-Path", true, u"bounce@lists.example.org"},
+      // The first address of a list, trailing comma and all.
+      {u"To", true, u"babbage@example.com,"},
+      // A dotted local part keeps only what follows its last dot; a trailing comma stays.
+      {u"Reply-To", true, u"c@example.com,"},
+      {u"Subject", true, std::nullopt},  // a value without an address
+      {u"X-Note", true, std::nullopt},   // no value at all
+      {u"Subject", false, u"Hello"},     // extraction off
+  };
+  for (const Case& c : cases)
+    EXPECT_EQ(headerValueForField(kMessage, c.field, c.extract), c.expected) << toUTF8(c.field);
+  // An empty value is returned as it is, extraction or not.
+  EXPECT_EQ(headerValueForField(u"Subject: \nBody", u"Subject", true), u"");
+}
+
+TEST(HeaderValue, OddMessagesGetDefinedAnswers) {
+  EXPECT_EQ(headerValueForField(u"", u"Subject"), std::nullopt);
+  // Unpaired surrogates pass through untouched.
+  EXPECT_EQ(headerValueForField(u"Subject: a\xD800z\n", u"subject"), String(u"a\xD800z"));
+  // The white space after the colon may be the line end itself; the value is then the
+  // next line, as the pattern reads it.
+  EXPECT_EQ(headerValueForField(u"Subject:\nNext line", u"Subject"), u"Next line");
+  // A megabyte of body before the header is still searched.
+  String big(1 << 20, u'x');
+  EXPECT_EQ(headerValueForField(big + u"\nSubject: late", u"subject"), u"late");
+  // A field whose matching runs away is stopped and answers nothing.
+  String runaway(5000, u'a');
+  auto start = std::chrono::steady_clock::now();
+  EXPECT_EQ(headerValueForField(runaway + u"\n", u"(?:a|aa)+(?:a|aa)+b"), std::nullopt);
+  EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(30));
+}
+
+}  // namespace
+}  // namespace corvel

@@ -1,0 +1,110 @@
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <fstream>
+#include <map>
+#include <thread>
+
+#include "Corvelbase/Language.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+using Language::dominantLanguage;
+
+// The committed evaluation set: one file per language, one sentence a line. Chinese of
+// either script is expected as "zh".
+const std::pair<const char*, const char*> kEvaluationFiles[] = {
+    {"en", "en"}, {"fr", "fr"}, {"de", "de"}, {"it", "it"}, {"pt", "pt"},      {"es", "es"},
+    {"ru", "ru"}, {"uk", "uk"}, {"ja", "ja"}, {"ko", "ko"}, {"zh-Hans", "zh"}, {"zh-Hant", "zh"},
+};
+
+std::vector<std::string> sentences(const std::string& language) {
+  std::ifstream in(testing::fixturePath("language/" + language + ".txt"));
+  std::vector<std::string> lines;
+  for (std::string line; std::getline(in, line);)
+    if (!line.empty()) lines.push_back(line);
+  return lines;
+}
+
+TEST(DominantLanguage, EvaluationSetIsRecognisedWellInEveryLanguage) {
+  int right = 0, total = 0;
+  for (const auto& [file, expected] : kEvaluationFiles) {
+    std::vector<std::string> lines = sentences(file);
+    ASSERT_GE(lines.size(), 20u) << file;
+    int rightHere = 0;
+    for (const std::string& line : lines) {
+      ASSERT_GE(fromUTF8(line).size(), 40u) << line;
+      std::optional<std::string> got = dominantLanguage(fromUTF8(line));
+      rightHere += got == expected ? 1 : 0;
+    }
+    EXPECT_GE(rightHere * 100, 85 * static_cast<int>(lines.size())) << file;
+    right += rightHere;
+    total += static_cast<int>(lines.size());
+  }
+  EXPECT_GE(right * 100, 95 * total) << right << " of " << total;
+}
+
+TEST(DominantLanguage, EdgeCasesHaveDefinedAnswers) {
+  struct Case {
+    std::u16string text;
+    std::optional<std::string> expected;
+  } cases[] = {
+      {u"", std::nullopt},
+      // No letters, or a script no detector knows: undetermined.
+      {u"1234567890 !!! ??? ... 42", std::nullopt},
+      {u"\U00010000\U00010001\U00010002 \U00010003\U00010004", std::nullopt},  // Linear B
+      {u"\u2801\u2803\u2809\u2819 \u2811\u280B", std::nullopt},                // Braille
+      // Traditional Chinese is reported as plain "zh".
+      {u"圖書館星期天關門比較早，所以我們應該在中午以前把借來的書都還回去，免得被罰款。", "zh"},
+      // Unpaired surrogates are read as replacement characters, not as an error.
+      {u"Das ist ein ganz normaler deutscher Satz \xD800 über das Wetter von morgen.", "de"},
+      {std::u16string(1, u'\xDC00'), std::nullopt},
+  };
+  for (const Case& c : cases) EXPECT_EQ(dominantLanguage(c.text), c.expected) << toUTF8(c.text);
+}
+
+TEST(DominantLanguage, LooksOnlyAtTheFirst4096Units) {
+  std::u16string english = fromUTF8(sentences("en").front()) + u" ";
+  std::u16string russian = fromUTF8(sentences("ru").front()) + u" ";
+  // English fills the window; megabytes of Russian after it change nothing.
+  std::u16string text;
+  while (text.size() < Language::kLanguageDetectionLength) text += english;
+  text.resize(Language::kLanguageDetectionLength);
+  std::u16string tail;
+  while (tail.size() < 2'000'000) tail += russian;
+  EXPECT_EQ(dominantLanguage(text + tail), "en");
+  // Digits fill the window: the Russian after it is never seen.
+  std::u16string digits(Language::kLanguageDetectionLength, u'7');
+  EXPECT_EQ(dominantLanguage(digits + tail), std::nullopt);
+  // A surrogate pair cut by the window's end is harmless.
+  std::u16string cut(Language::kLanguageDetectionLength - 1, u' ');
+  EXPECT_EQ(dominantLanguage(cut + u"\U0001F600" + russian), std::nullopt);
+}
+
+TEST(DominantLanguage, ManyThreadsAtOnceGetTheSameAnswers) {
+  // Texts that reach the shared second detector (one CLD2 leaves to it) and texts that
+  // do not, mixed, so the threads contend for its lock.
+  std::vector<std::pair<std::u16string, std::optional<std::string>>> work;
+  for (const auto& [file, expected] : kEvaluationFiles)
+    for (const std::string& line : sentences(file))
+      work.emplace_back(fromUTF8(line), dominantLanguage(fromUTF8(line)));
+  work.emplace_back(u"1234 5678", std::nullopt);
+  std::vector<std::thread> threads;
+  std::atomic<int> mismatches{0};
+  for (int t = 0; t < 8; ++t) {
+    threads.emplace_back([&, t] {
+      for (int round = 0; round < 3; ++round)
+        for (std::size_t i = t; i < work.size() + t; ++i) {
+          const auto& [text, expected] = work[i % work.size()];
+          if (dominantLanguage(text) != expected) ++mismatches;
+        }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(mismatches.load(), 0);
+}
+
+}  // namespace
+}  // namespace corvel

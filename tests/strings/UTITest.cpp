@@ -1,0 +1,100 @@
+#include <gtest/gtest.h>
+
+#include "Corvelbase/UTI.h"
+#include "Corvelbase/platform/TypeRegistry.h"
+
+namespace corvel {
+namespace {
+
+struct PairCase {
+  const char16_t* uti;
+  const char16_t* other;
+  bool conforms;
+  bool equal;
+};
+
+TEST(UTI, ConformanceAndEqualityGoThroughTheValidString) {
+  const PairCase cases[] = {
+      // Clippings count as the unknown item kind, on either side.
+      {u"com.apple.finder.textclipping", u"com.corvelworks.tessel.unknown", true, true},
+      {u"com.apple.finder.pictclipping", u"COM.CORVELWORKS.TESSEL.UNKNOWN", true, true},
+      {u"com.corvelworks.tessel.unknown", u"com.apple.finder.pictclipping", true, true},
+      {u"com.apple.finder.textclipping", u"com.apple.finder.textclipping", true, true},
+      {u"com.apple.finder.textclipping", u"com.apple.finder.pictclipping", true, true},
+      {u"com.apple.finder.textclipping", u"public.text", false, false},
+      {u"com.apple.finder.textclipping", u"public.item", true, false},
+      // The clipping test is exact: another case is just an unknown identifier.
+      {u"COM.APPLE.FINDER.TEXTCLIPPING", u"com.corvelworks.tessel.unknown", false, false},
+      {u"com.apple.finder.textclipping", u"com.apple.finder.TEXTclipping", false, false},
+      // Ordinary types.
+      {u"public.jpeg", u"public.image", true, false},
+      {u"public.image", u"public.jpeg", false, false},
+      {u"Public.JPEG", u"public.jpeg", true, true},
+      {u"net.daringfireball.markdown", u"public.text", true, false},
+      {u"com.corvelworks.tessel.formattednote", u"public.content", true, false},
+      {u"com.corvelworks.tessel.database", u"public.content", false, false},
+      {u"com.corvelworks.tessel.smartgroup", u"public.item", true, false},
+      {u"", u"", true, true},
+  };
+  for (const PairCase& c : cases) {
+    String uti(c.uti), other(c.other);
+    EXPECT_EQ(UTI::conformsToUTI(uti, other), c.conforms) << toUTF8(uti) << " / " << toUTF8(other);
+    EXPECT_EQ(UTI::conformsToUTIString(uti, other), c.conforms) << toUTF8(uti);
+    EXPECT_EQ(UTI::isEqualToUTI(uti, other), c.equal) << toUTF8(uti) << " / " << toUTF8(other);
+    EXPECT_EQ(UTI::isEqualToUTIString(uti, other), c.equal) << toUTF8(uti);
+  }
+}
+
+TEST(UTI, NilArgumentsAnswerNo) {
+  for (const char16_t* uti : {u"public.item", u"", u"com.apple.finder.textclipping"}) {
+    EXPECT_FALSE(UTI::conformsToUTI(uti, std::nullopt));
+    EXPECT_FALSE(UTI::conformsToUTIString(uti, std::nullopt));
+    EXPECT_FALSE(UTI::isEqualToUTI(uti, std::nullopt));
+    EXPECT_FALSE(UTI::isEqualToUTIString(uti, std::nullopt));
+  }
+}
+
+TEST(UTI, ValidStringDynamicAndRTFKind) {
+  EXPECT_EQ(UTI::validUTIString(u"com.apple.finder.textclipping"), kUTTypeRVMXUnknown);
+  EXPECT_EQ(UTI::validUTIString(u"public.png"), u"public.png");
+
+  struct {
+    const char16_t* uti;
+    bool dynamic;
+    bool rtfKind;
+  } cases[] = {
+      {u"dyn.ah62d4rv4ge81g6pq", true, false},
+      {u"dyn.", true, false},
+      {u"DYN.ah62d4rv4ge81g6pq", false, false},
+      {u"dyn", false, false},
+      {u"public.rtf", false, true},
+      {u"PUBLIC.RTF", false, true},
+      {u"com.apple.rtfd", false, true},
+      {u"com.apple.flat-rtfd", false, false},
+      {u"public.text", false, false},
+      {u"", false, false},
+  };
+  for (const auto& c : cases) {
+    EXPECT_EQ(UTI::isDynamicUTI(c.uti), c.dynamic) << toUTF8(c.uti);
+    EXPECT_EQ(UTI::isRTFKindUTI(c.uti), c.rtfKind) << toUTF8(c.uti);
+  }
+  // A host type that conforms to RTF is still no RTF kind.
+  TypeRegistry::shared().declare({"com.example.rtf-flavour", {"public.rtf"}, {}, {}, ""});
+  EXPECT_TRUE(UTI::conformsToUTI(u"com.example.rtf-flavour", String(u"public.rtf")));
+  EXPECT_FALSE(UTI::isRTFKindUTI(u"com.example.rtf-flavour"));
+}
+
+TEST(UTI, ExportedConstantsAreDeclaredTypes) {
+  TypeRegistry& types = TypeRegistry::shared();
+  for (std::u16string_view constant :
+       {kUTTypeRVMXDatabase, kUTTypeRVMXGroup, kUTTypeRVMXSheet, kUTTypeRVMXSmartGroup,
+        kUTTypeRVMXPlaceholder, kUTTypeRVMXFeed, kUTTypeRVMXFormattedNote, kUTTypeRVMXUnknown,
+        kUTTypeMarkdown, kUTTypeAppleMail, kUTTypeWebInternetLocation, kUTTypeTextbundle,
+        kUTTypeCompressedTextBundle, kUTTypeHEIC, kUTTypeURLName})
+    EXPECT_TRUE(types.isDeclared(toUTF8(constant))) << toUTF8(constant);
+  EXPECT_EQ(kUTTypeRVMXSmartGroup, u"com.corvelworks.tessel.smartgroup");
+  EXPECT_EQ(kUTTypeCompressedTextBundle, u"org.textbundle.compressed");
+}
+
+}  // namespace
+}  // namespace corvel
