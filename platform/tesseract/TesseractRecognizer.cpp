@@ -43,6 +43,9 @@ constexpr const char* kLatinModels[] = {"eng", "fra", "deu", "ita", "por", "spa"
 // Orientation and script detection below these confidences is a guess.
 constexpr float kMinOrientationConfidence = 2.0f;
 constexpr float kMinScriptConfidence = 1.0f;
+// A page read with a detected script's model whose lines average less than this is read
+// again with the Latin languages.
+constexpr double kMinDetectedConfidence = 0.75;
 // Resolutions outside this range are missing or nonsense in the file.
 constexpr int kMinResolution = 70, kMaxResolution = 2400, kDefaultResolution = 300;
 
@@ -154,6 +157,13 @@ struct PassResult {
   std::string text;  // all lines, for language identification
 };
 
+double meanConfidence(const PassResult& result) {
+  if (result.observations.empty()) return 0;
+  double sum = 0;
+  for (const auto& observation : result.observations) sum += observation.candidates[0].confidence;
+  return sum / static_cast<double>(result.observations.size());
+}
+
 }  // namespace
 
 struct TesseractRecognizer::Impl {
@@ -231,10 +241,10 @@ struct TesseractRecognizer::Impl {
                                        &scriptConfidence)) {
         return;
       }
-      // `degrees` is how far the page is turned anticlockwise; turning it back clockwise
-      // by the same amount makes it upright.
+      // `degrees` is how far the page's text is turned clockwise from upright; turning
+      // the page clockwise by the rest of a full turn makes it upright.
       if (orientationConfidence >= kMinOrientationConfidence && degrees % 90 == 0) {
-        result.rotateQuadrants = ((degrees / 90) % 4 + 4) % 4;
+        result.rotateQuadrants = ((360 - degrees) / 90) % 4;
       }
       if (script && scriptConfidence >= kMinScriptConfidence) result.script = script;
     });
@@ -375,26 +385,37 @@ std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recog
       if (upright) page.reset(upright);
     }
   }
+  std::string latin = impl.latinModels();
+  bool scriptTrusted = false;
   if (detect) {
     std::string scriptModel = modelForScript(orientation.script);
-    models =
-        !scriptModel.empty() && impl.isInstalled(scriptModel) ? scriptModel : impl.latinModels();
-    if (models.empty())
-      models = impl.installedCodes.empty() ? "eng" : modelForCode(impl.installedCodes[0]);
+    scriptTrusted = !scriptModel.empty() && impl.isInstalled(scriptModel);
+    models = scriptTrusted ? scriptModel : latin;
+    if (models.empty()) models = modelForCode(impl.installedCodes.front());
   }
 
   PassResult result;
   if (!impl.recognisePass(page.get(), models, request, fast, &result, error)) return std::nullopt;
-  if (detect && models.find('+') == std::string::npos) {
+  if (!detect) return std::move(result.observations);
+
+  if (models.find('+') == std::string::npos) {
     // The script's model reads the text well enough to tell its language; read again
     // with that language's own model when it is another one.
-    std::string language = tesseract_backend::identifyLanguage(result.text);
-    std::string better = modelForCode(language);
+    std::string better = modelForCode(tesseract_backend::identifyLanguage(result.text));
     if (!better.empty() && better != models && impl.isInstalled(better)) {
       PassResult second;
       if (impl.recognisePass(page.get(), better, request, fast, &second, error)) {
         result = std::move(second);
       }
+    }
+  }
+  if (scriptTrusted && meanConfidence(result) < kMinDetectedConfidence && !latin.empty() &&
+      latin != models) {
+    // A weak script verdict that read poorly: the page may be Latin after all.
+    PassResult fallback;
+    if (impl.recognisePass(page.get(), latin, request, fast, &fallback, error) &&
+        meanConfidence(fallback) > meanConfidence(result)) {
+      result = std::move(fallback);
     }
   }
   return std::move(result.observations);
