@@ -28,7 +28,10 @@ bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes, std
   std::filesystem::path target(path);
   std::filesystem::path dir = target.parent_path();
   if (dir.empty()) dir = ".";
-  std::string pattern = (dir / ("." + target.filename().string() + ".XXXXXX")).string();
+  // Appended piece by piece: GCC 12 at -O3 misreads "." + string + "..." (-Wrestrict).
+  std::string name = ".";
+  name.append(target.filename().string()).append(".XXXXXX");
+  std::string pattern = (dir / name).string();
   int fd = mkstemp(pattern.data());
   if (fd < 0) return false;
   bool ok = true;

@@ -50,6 +50,10 @@ Rect rectUnion(const Rect& a, const Rect& b) {
   if (rectIsNull(a)) return rectStandardize(b);
   if (rectIsNull(b)) return rectStandardize(a);
   Rect s = rectStandardize(a), t = rectStandardize(b);
+  // A rectangle that holds the other is the union as it stands: recomputing the size from
+  // the edges would round, and a box grown by itself would change.
+  if (rectContainsRect(s, t)) return s;
+  if (rectContainsRect(t, s)) return t;
   double minX = std::min(s.origin.x, t.origin.x);
   double minY = std::min(s.origin.y, t.origin.y);
   double maxX = std::max(s.origin.x + s.size.width, t.origin.x + t.size.width);

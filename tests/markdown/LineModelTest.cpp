@@ -1,0 +1,105 @@
+#include <gtest/gtest.h>
+
+#include <limits>
+#include <random>
+
+#include "Corvelbase/MarkdownCommands.h"
+#include "Corvelbase/platform/Lines.h"
+#include "ReferenceLineModel.h"
+
+namespace corvel {
+namespace {
+
+using MarkdownCommands::LineItem;
+using MarkdownCommands::linesForRange;
+constexpr std::uint64_t kMax = std::numeric_limits<std::uint64_t>::max();
+
+TEST(Lines, EndOnlyAfterLineFeedAndKeepTheirTerminators) {
+  struct Case {
+    String text;
+    std::vector<String> lines;
+  } cases[] = {
+      {u"", {}},
+      {u"a", {u"a"}},
+      {u"a\n", {u"a\n"}},  // no empty line after a final line feed
+      {u"\n\n", {u"\n", u"\n"}},
+      {u"a\r\nb\rc\n", {u"a\r\n", u"b\rc\n"}},  // CR stays in its line, never ends one
+      {u"\r", {u"\r"}},
+      {u"\xD800\n\xDC00", {u"\xD800\n", u"\xDC00"}},  // unpaired surrogates are plain units
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(lines(c.text), c.lines) << toUTF8(c.text);
+  }
+}
+
+TEST(Lines, LastCharacterIsTheLastCodeUnit) {
+  EXPECT_EQ(lastCharacter(u""), u'\0');
+  EXPECT_EQ(lastCharacter(u"ab"), u'b');
+  EXPECT_EQ(lastCharacter(u"a\r\n"), u'\n');
+  EXPECT_EQ(lastCharacter(u"\U0001F600"), u'\xDE00');  // low half of the pair
+}
+
+struct LinesCase {
+  const char* what;
+  String text;
+  Range selection;
+  std::vector<LineItem> expected;
+};
+
+TEST(LinesForRange, TakesTheLinesASelectionTouches) {
+  const LinesCase cases[] = {
+      // The empty-line item: nothing real to take.
+      {"empty text", u"", {0, 0}, {{u"", {0, 0}}}},
+      {"caret after final feed", u"abc\n", {4, 0}, {{u"", {4, 0}}}},
+      {"caret at end, no final feed", u"abc", {3, 0}, {{u"abc", {0, 3}}}},
+      // Carets.
+      {"caret at line start", u"a\nb\nc", {2, 0}, {{u"b\n", {2, 2}}}},
+      {"caret before a feed", u"a\nb\nc", {1, 0}, {{u"a\n", {0, 2}}}},
+      {"caret on an empty line", u"a\n\nb", {2, 0}, {{u"\n", {2, 1}}}},
+      // Selections and line boundaries.
+      {"ends at a line start", u"a\nb\nc", {0, 2}, {{u"a\n", {0, 2}}}},
+      {"spans a feed", u"a\nb\nc", {1, 2}, {{u"a\n", {0, 2}}, {u"b\n", {2, 2}}}},
+      {"whole document", u"a\nb", {0, 3}, {{u"a\n", {0, 2}}, {u"b", {2, 1}}}},
+      {"CR LF lines", u"a\r\nb", {0, 4}, {{u"a\r\n", {0, 3}}, {u"b", {3, 1}}}},
+      {"lone CR is no break", u"a\rb", {2, 0}, {{u"a\rb", {0, 3}}}},
+      // Out of range: clamped to the text first.
+      {"location past end", u"ab\n", {10, 0}, {{u"", {3, 0}}}},
+      {"length past end", u"ab\ncd", {1, 99}, {{u"ab\n", {0, 3}}, {u"cd", {3, 2}}}},
+      {"length overflows", u"ab", {1, kMax}, {{u"ab", {0, 2}}}},
+      {"not-found location", u"ab", NotFoundRange, {{u"ab", {0, 2}}}},
+      {"both huge", u"a\n", {kMax, kMax}, {{u"", {2, 0}}}},
+  };
+  for (const LinesCase& c : cases) {
+    EXPECT_EQ(linesForRange(c.text, c.selection), c.expected) << c.what;
+  }
+}
+
+TEST(LinesForRange, RangeForItemGivesTheItemsRangeOrNotFound) {
+  LineItem item{u"b\n", {2, 2}};
+  EXPECT_EQ(MarkdownCommands::rangeForItem(u"a\nb\n", &item), (Range{2, 2}));
+  EXPECT_EQ(MarkdownCommands::rangeForItem(u"a\nb\n", nullptr), NotFoundRange);
+}
+
+// The fast path looks only around the selection; it must agree with walking every line.
+TEST(LinesForRange, AgreesWithTheStraightforwardModelOnRandomTexts) {
+  std::mt19937_64 rng(20261122);
+  const char16_t alphabet[] = {u'a', u'b', u'\n', u'\n', u'\r', u' ', u'#', u'\xD83D'};
+  std::uniform_int_distribution<std::size_t> pick(0, std::size(alphabet) - 1);
+  std::uniform_int_distribution<int> sizes(0, 40);
+  for (int round = 0; round < 4000; ++round) {
+    String text;
+    for (int n = sizes(rng); n > 0; --n) text.push_back(alphabet[pick(rng)]);
+    if (round % 3 == 0) text += u"\n";  // a good share of texts end with a line feed
+    std::uniform_int_distribution<std::uint64_t> positions(0, text.size() + 2);
+    for (int k = 0; k < 8; ++k) {
+      Range selection{positions(rng), positions(rng)};
+      if (k == 7) selection.length = kMax - (round % 5);  // overflowing lengths
+      ASSERT_EQ(linesForRange(text, selection), testing::referenceLinesForRange(text, selection))
+          << "text \"" << toUTF8(text) << "\" selection " << selection.location << ","
+          << selection.length;
+    }
+  }
+}
+
+}  // namespace
+}  // namespace corvel

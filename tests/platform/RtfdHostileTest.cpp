@@ -1,0 +1,210 @@
+#include <gtest/gtest.h>
+
+#include <chrono>
+#include <filesystem>
+
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/RTFD.h"
+#include "Corvelbase/platform/TextAttachment.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+namespace fs = std::filesystem;
+
+Data bytesOf(std::string_view text) { return Data(text.begin(), text.end()); }
+
+std::string graphic(const std::string& name) {
+  return "{{\\NeXTGraphic " + name + " \\width20 \\height20\n}\\'ac}";
+}
+
+TEST(RtfdHostile, UntrustedNamesNeverLeaveTheBundle) {
+  testing::TempDir dir;
+  // Files outside the bundle that a careless reader would pick up.
+  ASSERT_TRUE(writeFileAtomically(dir.file("secret.txt"), bytesOf("outside")));
+  std::string bundle = dir.file("doc.rtfd");
+  fs::create_directories(bundle + "/sub");
+  ASSERT_TRUE(writeFileAtomically(bundle + "/ok.png", bytesOf("inside")));
+  ASSERT_TRUE(writeFileAtomically(bundle + "/sub/x.txt", bytesOf("nested")));
+  fs::create_symlink(dir.file("secret.txt"), bundle + "/link.txt");
+  fs::create_symlink(dir.path(), bundle + "/up");
+
+  struct Case {
+    std::string name;   // as written inside the RTF
+    const char* reads;  // the bytes the attachment gets, or nullptr for none
+  } cases[] = {
+      {"ok.png", "inside"},
+      {"../secret.txt", nullptr},
+      {dir.file("secret.txt"), nullptr},  // an absolute path
+      {"sub/x.txt", nullptr},             // a separator, even inside the bundle
+      {"sub\\'2fx.txt", nullptr},         // the same separator escaped
+      {"..", nullptr},
+      {".", nullptr},
+      {"", nullptr},
+      {"link.txt", nullptr},  // a symbolic link to the outside
+      {"up", nullptr},
+      {"gone.png", nullptr},  // missing: a plain attachment, not a failed load
+      {"ok.png", "inside"},   // still found after all of the above
+  };
+  std::string rtf = "{\\rtf1\\ansi ";
+  for (const auto& c : cases) rtf += "[" + graphic(c.name) + "]";
+  rtf += "}";
+  ASSERT_TRUE(writeFileAtomically(bundle + "/TXT.rtf", bytesOf(rtf)));
+
+  auto fromDisk = attributedStringWithContentsOfRTFD(bundle);
+  auto fromWrapper = attributedStringWithRTFDFileWrapper(*FileWrapper::initWithPath(bundle));
+  for (const auto* read : {&fromDisk, &fromWrapper}) {
+    ASSERT_TRUE(*read);
+    const auto& text = **read;
+    ASSERT_EQ(text.length(), std::size(cases) * 3);
+    for (std::size_t i = 0; i < std::size(cases); ++i) {
+      auto attachment = text.attachmentAtIndex(i * 3 + 1);
+      ASSERT_TRUE(attachment) << cases[i].name;
+      EXPECT_FALSE(attachment->contents());
+      EXPECT_EQ(attachment->bounds(), Rect(0, 0, 1, 1));
+      auto wrapper = attachment->fileWrapper();
+      if (cases[i].reads) {
+        ASSERT_TRUE(wrapper) << cases[i].name;
+        EXPECT_EQ(wrapper->regularFileContents(), bytesOf(cases[i].reads));
+      } else {
+        EXPECT_FALSE(wrapper) << cases[i].name;
+      }
+    }
+  }
+}
+
+// Parses `rtf` alone; the result's text, or "<none>".
+std::u16string textOf(const std::string& rtf) {
+  auto read = attributedStringWithRTF(bytesOf(rtf));
+  return read ? read->string() : u"<none>";
+}
+
+TEST(RtfdHostile, MalformedRtfLoadsWhatIsSafe) {
+  struct Case {
+    const char* name;
+    std::string rtf;
+    std::u16string text;
+  } cases[] = {
+      // Not RTF at all.
+      {"empty", "", u"<none>"},
+      {"plain text", "hello", u"<none>"},
+      {"brace first", "}{\\rtf1 x}", u"<none>"},
+      {"header only", "{\\rtf", u""},
+      // Unbalanced groups: the document ends where its group closes, or at the end.
+      {"extra closers", "{\\rtf1 a}}}} b", u"a"},
+      {"never closed", "{\\rtf1 a{{{ b", u"a b"},
+      {"closed inside", "{\\rtf1 a{\\b b}c", u"abc"},
+      // Truncated escapes are dropped, not misread.
+      {"cut hex", "{\\rtf1 a\\'4", u"a"},
+      {"bad hex", "{\\rtf1 a\\'zzb}", u"azzb"},
+      {"cut word", "{\\rtf1 a\\", u"a"},
+      {"cut graphic", "{\\rtf1 a{{\\NeXTGraphic x.png", u"a"},
+      {"graphic at top", "{\\rtf1 a\\NeXTGraphic x.png b}", u"a"},
+      // Unicode escapes at their limits.
+      {"negative u", "{\\rtf1 \\u-4?}", u"\uFFFC"},
+      {"code point u", "{\\rtf1 \\u128512?}", u"\U0001F600"},
+      {"huge u", "{\\rtf1 \\u99999999999999999999?x}", u"x"},
+      {"uc skips", "{\\rtf1\\uc2 \\u233ab\\u233\\'e9\\'e9c}", u"\u00e9\u00e9c"},
+      {"uc ends at group", "{\\rtf1\\uc3 {\\u233a}b}", u"\u00e9b"},
+      // Binary data is skipped by its count, even past the end.
+      {"bin", "{\\rtf1 a\\bin3 }}}b}", u"ab"},
+      {"bin past end", "{\\rtf1 a\\bin99999999999 b}", u"a"},
+      // Ignorable and skipped destinations.
+      {"star", "{\\rtf1 a{\\*\\unknown zzz}b}", u"ab"},
+      {"font table", "{\\rtf1{\\fonttbl{\\f0 Helvetica;}}x}", u"x"},
+      // Other code pages decode through ICU; unknown ones fall back to Windows-1252.
+      {"cyrillic", "{\\rtf1\\ansi\\ansicpg1251 \\'c0\\'e1}", u"\u0410\u0431"},
+      {"shift-jis", "{\\rtf1\\ansi\\ansicpg932 \\'93\\'fa}", u"\u65e5"},
+      {"unknown page", "{\\rtf1\\ansi\\ansicpg99999 \\'e9}", u"\u00e9"},
+  };
+  for (const auto& c : cases) EXPECT_EQ(textOf(c.rtf), c.text) << c.name;
+}
+
+TEST(RtfdHostile, EveryTruncationOfAWrittenDocumentReadsAsItsBeginning) {
+  AttributedString text(u"caf\u00e9 {\\} \U0001F600\n\tx\u2028y");
+  text.appendAttributedString(AttributedString::attributedStringWithAttachment(
+      TextAttachment::initWithData(bytesOf("data"), "public.data")));
+  text.appendAttributedString(AttributedString(u"tail"));
+  auto bundle = RTFDFileWrapperFromRange(text, Range{0, text.length()});
+  Data rtf = *bundle->fileWrappers().at(RTFDTextFileName)->regularFileContents();
+  const String& full = text.string();
+  for (std::size_t cut = 5; cut <= rtf.size(); ++cut) {
+    auto read = attributedStringWithRTF(Data(rtf.begin(), rtf.begin() + static_cast<long>(cut)));
+    ASSERT_TRUE(read) << cut;
+    // Everything but the last unit is a prefix (a cut escape such as "\u23" for "\u233"
+    // may give one other character).
+    String got = read->string();
+    if (!got.empty()) got.pop_back();
+    EXPECT_EQ(full.substr(0, got.size()), got) << "cut at " << cut;
+  }
+  EXPECT_EQ(attributedStringWithRTF(rtf)->string(), full);
+}
+
+TEST(RtfdHostile, HugeTokensAndDeepNestingStayQuick) {
+  struct Case {
+    const char* name;
+    std::string_view prefix;
+    std::size_t count;
+    char filler;
+    std::string_view suffix;
+    std::u16string text;
+  } cases[] = {
+      {"100 MB control word", "{\\rtf1 a\\", 100u << 20, 'x', " b}", u"ab"},
+      {"16 MB parameter", "{\\rtf1 a\\fs", 16u << 20, '9', " b}", u"ab"},
+      {"a million groups", "{\\rtf1 a", 1u << 20, '{', "b", u"ab"},
+      {"a million closers", "{\\rtf1 a", 1u << 20, '}', "b", u"a"},
+  };
+  for (const auto& c : cases) {
+    Data rtf;
+    rtf.reserve(c.prefix.size() + c.count + c.suffix.size());
+    rtf.insert(rtf.end(), c.prefix.begin(), c.prefix.end());
+    rtf.resize(rtf.size() + c.count, static_cast<std::uint8_t>(c.filler));
+    rtf.insert(rtf.end(), c.suffix.begin(), c.suffix.end());
+    auto started = std::chrono::steady_clock::now();
+    auto read = attributedStringWithRTF(rtf);
+    auto seconds =
+        std::chrono::duration<double>(std::chrono::steady_clock::now() - started).count();
+    ASSERT_TRUE(read) << c.name;
+    EXPECT_EQ(read->string(), c.text) << c.name;
+    EXPECT_LT(seconds, 5.0) << c.name;
+  }
+}
+
+TEST(RtfdHostile, BrokenFlatFormsAreRefused) {
+  AttributedString text(u"x");
+  text.appendAttributedString(AttributedString::attributedStringWithAttachment(
+      TextAttachment::initWithData(bytesOf("payload"), "public.data")));
+  Data flat = RTFDFromRange(text, Range{0, 2});
+  ASSERT_TRUE(attributedStringWithRTFD(flat));
+  // Every strict prefix is refused whole: a bundle cut short is no bundle.
+  for (std::size_t cut = 0; cut < flat.size(); ++cut)
+    EXPECT_FALSE(
+        attributedStringWithRTFD(Data(flat.begin(), flat.begin() + static_cast<long>(cut))))
+        << cut;
+  // Absurd counts and lengths fail without allocating them.
+  struct Case {
+    const char* name;
+    std::size_t at;
+    std::uint32_t word;  // written little-endian over the bytes at `at`
+  } cases[] = {{"wrong magic", 0, 0x78787878},
+               {"unknown record type", 8, 7},
+               {"child count", 12, 0x7F0000FF},
+               {"name length", 16, 0x7FFFFFFF}};
+  for (const auto& c : cases) {
+    Data broken = flat;
+    for (int i = 0; i < 4; ++i) broken[c.at + i] = static_cast<std::uint8_t>(c.word >> (8 * i));
+    EXPECT_FALSE(attributedStringWithRTFD(broken)) << c.name;
+  }
+  // A bundle without TXT.rtf, or with a directory in its place, is no document.
+  auto noText = FileWrapper::initDirectoryWithFileWrappers(
+      {{"a.txt", FileWrapper::initRegularFileWithContents(bytesOf("a"))}});
+  EXPECT_FALSE(attributedStringWithRTFDFileWrapper(*noText));
+  auto dirText = FileWrapper::initDirectoryWithFileWrappers(
+      {{"TXT.rtf", FileWrapper::initDirectoryWithFileWrappers({})}});
+  EXPECT_FALSE(attributedStringWithRTFDFileWrapper(*dirText));
+  EXPECT_FALSE(attributedStringWithRTFDFileWrapper(*FileWrapper::initRegularFileWithContents({})));
+}
+
+}  // namespace
+}  // namespace corvel

@@ -1,0 +1,291 @@
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <set>
+
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/RTFD.h"
+#include "Corvelbase/platform/TextAttachment.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+namespace fs = std::filesystem;
+
+Data bytesOf(std::string_view text) { return Data(text.begin(), text.end()); }
+
+Data fixture(const std::string& name) {
+  return readFile(testing::fixturePath("images/" + name)).value_or(Data{});
+}
+
+// Text that exercises every escape of the writer: RTF's own specials, line breaks of
+// every kind, tabs, Latin-1, characters outside Windows-1252, astral characters, control
+// characters, a lone surrogate and a plain attachment character without an attachment.
+const String kTrickyText =
+    String(
+        u"Hello {world} back\\slash \\par {\\rtf1}\n\ttab\r\nCR LF\rCR\u2028LS\u2029PS "
+        u"caf\u00e9 \u00a0nbsp \u20ac \u2014 \u65e5\u672c\u8a9e \U0001F600 \U00010348 "
+        u"\x01\x1f\x7f\u0080\u009f ") +
+    char16_t(0xDC00) + u" \uFFFC \uFFFF end";
+
+struct Sample {
+  AttributedString text;
+  std::vector<std::shared_ptr<TextAttachment>> attachments;
+};
+
+// Attachments of every source the writer knows, one of them standing twice.
+Sample sampleText() {
+  Sample s;
+  auto png = TextAttachment::initWithData(fixture("sample.png"), "public.png");
+  auto notesFile = FileWrapper::initRegularFileWithContents(bytesOf("notes\n"));
+  notesFile->setPreferredFilename("notes.txt");
+  auto notes = TextAttachment::initWithFileWrapper(notesFile);
+  notes->setBounds(Rect(0, 0, 32, 16));
+  auto picture = TextAttachment::init();
+  picture->setImage(Image::initWithData(fixture("sample.png")));
+  s.attachments = {png, notes, notes, picture};
+  s.text.appendAttributedString(AttributedString(kTrickyText));
+  for (const auto& a : s.attachments) {
+    s.text.appendAttributedString(AttributedString::attributedStringWithAttachment(a));
+    s.text.appendAttributedString(AttributedString(u" | "));
+  }
+  return s;
+}
+
+// Checks that `read` has the same characters as `written`, an attachment exactly where
+// `written` has one, and files with the expected names and bytes.
+void expectSameDocument(const AttributedString& read, const Sample& written) {
+  ASSERT_EQ(read.string(), written.text.string());
+  std::vector<std::shared_ptr<TextAttachment>> found;
+  for (std::uint64_t i = 0; i < read.length(); ++i) {
+    EXPECT_EQ(read.attachmentAtIndex(i) != nullptr, written.text.attachmentAtIndex(i) != nullptr)
+        << "at " << i;
+    if (auto a = read.attachmentAtIndex(i)) found.push_back(a);
+  }
+  ASSERT_EQ(found.size(), 4u);
+  struct Expected {
+    const char* name;
+    Data bytes;
+  } expected[] = {{"Attachment.png", fixture("sample.png")},
+                  {"notes.txt", bytesOf("notes\n")},
+                  {"notes.txt", bytesOf("notes\n")},
+                  {"Attachment.jpeg", {}}};
+  for (std::size_t i = 0; i < found.size(); ++i) {
+    auto wrapper = found[i]->fileWrapper();
+    ASSERT_TRUE(wrapper) << i;
+    EXPECT_EQ(wrapper->filename(), expected[i].name);
+    EXPECT_EQ(wrapper->preferredFilename(), expected[i].name);
+    if (!expected[i].bytes.empty()) {
+      EXPECT_EQ(wrapper->regularFileContents(), expected[i].bytes);
+    }
+  }
+  // One file, one wrapper: the attachment that stood twice shares it when read back.
+  EXPECT_EQ(found[1]->fileWrapper(), found[2]->fileWrapper());
+  EXPECT_EQ(found[1]->bounds(), Rect(0, 0, 32, 16));
+  // The picture without a file went out as JPEG and decodes to the same size.
+  auto jpeg = Image::initWithData(*found[3]->fileWrapper()->regularFileContents());
+  ASSERT_TRUE(jpeg);
+  EXPECT_EQ(jpeg->size(), (Size{24, 16}));
+  EXPECT_EQ(found[3]->bounds(), Rect(0, 0, 24, 16));
+}
+
+TEST(Rtfd, BundleOnDiskRoundTripsTextAndFiles) {
+  testing::TempDir dir;
+  Sample sample = sampleText();
+  std::string path = dir.file("doc.rtfd");
+  ASSERT_TRUE(writeRTFDToPath(sample.text, path));
+  std::set<std::string> names;
+  for (const auto& entry : fs::directory_iterator(path)) names.insert(entry.path().filename());
+  EXPECT_EQ(names,
+            (std::set<std::string>{"TXT.rtf", "Attachment.png", "notes.txt", "Attachment.jpeg"}));
+  auto read = attributedStringWithContentsOfRTFD(path);
+  ASSERT_TRUE(read);
+  expectSameDocument(*read, sample);
+
+  // Saving what was read gives the same bundle again, over the old one.
+  ASSERT_TRUE(writeRTFDToPath(*read, path));
+  auto again = attributedStringWithContentsOfRTFD(path);
+  ASSERT_TRUE(again);
+  expectSameDocument(*again, sample);
+  // No staging directory is left beside the bundle.
+  EXPECT_EQ(std::distance(fs::directory_iterator(dir.path()), fs::directory_iterator()), 1);
+}
+
+TEST(Rtfd, FlatFormRoundTripsTextAndFiles) {
+  Sample sample = sampleText();
+  Data flat = RTFDFromRange(sample.text, Range{0, sample.text.length()});
+  ASSERT_GT(flat.size(), 8u);
+  EXPECT_EQ(std::string(flat.begin(), flat.begin() + 4), "rtfd");
+  auto read = attributedStringWithRTFD(flat);
+  ASSERT_TRUE(read);
+  expectSameDocument(*read, sample);
+
+  // A range writes only its part.
+  auto part = attributedStringWithRTFD(RTFDFromRange(sample.text, Range{6, 7}));
+  ASSERT_TRUE(part);
+  EXPECT_EQ(part->string(), u"{world}");
+}
+
+TEST(Rtfd, TheWriterAsksTheAttachmentAtWritingTime) {
+  // An attachment whose wrapper depends on its state, the way exporting attachments do.
+  struct Switching : TextAttachment {
+    explicit Switching(Passkey k) : TextAttachment(k) {}
+    static std::shared_ptr<Switching> make() { return alloc<Switching>(); }
+    std::shared_ptr<FileWrapper> fileWrapper() const override {
+      if (!exporting) return nullptr;
+      auto w = FileWrapper::initRegularFileWithContents(bytesOf("stroke"));
+      w->setPreferredFilename("X.pencildata");
+      return w;
+    }
+    bool exporting = false;
+  };
+  auto a = Switching::make();
+  auto text = AttributedString::attributedStringWithAttachment(a);
+  // Nothing to write: the character goes out plain and the bundle holds only the text.
+  auto editing = RTFDFileWrapperFromRange(text, Range{0, 1});
+  EXPECT_EQ(editing->fileWrappers().size(), 1u);
+  auto plain = attributedStringWithRTFDFileWrapper(*editing);
+  ASSERT_TRUE(plain);
+  EXPECT_EQ(plain->string(), u"\uFFFC");
+  EXPECT_FALSE(plain->attachmentAtIndex(0));
+
+  a->exporting = true;
+  auto exported = RTFDFileWrapperFromRange(text, Range{0, 1});
+  ASSERT_EQ(exported->fileWrappers().count("X.pencildata"), 1u);
+  auto read = attributedStringWithRTFDFileWrapper(*exported);
+  ASSERT_TRUE(read && read->attachmentAtIndex(0));
+  EXPECT_EQ(read->attachmentAtIndex(0)->fileWrapper()->regularFileContents(), bytesOf("stroke"));
+}
+
+TEST(Rtfd, AttachmentNamesAreMadeSafeAndUnique) {
+  struct Case {
+    const char* wanted;
+    const char* written;
+  } cases[] = {
+      {"TXT.rtf", "TXT 2.rtf"},  {"a/b.png", "a_b.png"},
+      {"..", "Attachment"},      {"  spaced.png  ", "spaced.png"},
+      {"tab\tname", "tab_name"}, {"a/b.png", "a_b 2.png"},
+      {"", "Attachment 2"},      {"caf\xc3\xa9 {1}.txt", "caf\xc3\xa9 {1}.txt"},
+  };
+  AttributedString text;
+  for (const auto& c : cases) {
+    auto w = FileWrapper::initRegularFileWithContents(bytesOf(c.wanted));
+    w->setPreferredFilename(c.wanted);
+    text.appendAttributedString(
+        AttributedString::attributedStringWithAttachment(TextAttachment::initWithFileWrapper(w)));
+  }
+  auto bundle = RTFDFileWrapperFromRange(text, Range{0, text.length()});
+  auto read = attributedStringWithRTFDFileWrapper(*bundle);
+  ASSERT_TRUE(read);
+  ASSERT_EQ(read->length(), std::size(cases));
+  for (std::size_t i = 0; i < std::size(cases); ++i) {
+    auto wrapper = read->attachmentAtIndex(i)->fileWrapper();
+    ASSERT_TRUE(wrapper) << cases[i].wanted;
+    EXPECT_EQ(wrapper->filename(), cases[i].written);
+    EXPECT_EQ(wrapper->regularFileContents(), bytesOf(cases[i].wanted));
+  }
+}
+
+TEST(Rtfd, AnOutsideReaderFindsTheText) {
+  testing::TempDir dir;
+  AttributedString text(u"Quarterly report {draft} with back\\slash\nSecond caf\u00e9 line");
+  text.appendAttributedString(AttributedString::attributedStringWithAttachment(
+      TextAttachment::initWithData(fixture("sample.png"), "public.png")));
+  text.appendAttributedString(AttributedString(u"after the picture"));
+  ASSERT_TRUE(writeRTFDToPath(text, dir.file("r.rtfd")));
+  auto result =
+      testing::runCommand("unrtf --text '" + dir.file("r.rtfd/TXT.rtf") + "' 2>/dev/null");
+  ASSERT_EQ(result.status, 0) << result.output;
+  // unrtf writes Latin-1 in its text mode.
+  for (const char* wanted :
+       {"Quarterly report {draft} with back\\slash", "Second caf\xe9 line", "after the picture"})
+    EXPECT_NE(result.output.find(wanted), std::string::npos) << wanted << "\n" << result.output;
+}
+
+TEST(Rtfd, ReadsWhatTheDesktopEditorsWrite) {
+  // The shape of a bundle's TXT.rtf as the platform's editors save it: a code page, a
+  // font table, cocoa control words, a raw 8-bit placeholder and \'xx text.
+  std::string rtf =
+      "{\\rtf1\\ansi\\ansicpg1252\\cocoartf2639\n"
+      "\\cocoatextscaling0\\cocoaplatform0{\\fonttbl\\f0\\fswiss\\fcharset0 Helvetica;}\n"
+      "{\\colortbl;\\red255\\green255\\blue255;}\n"
+      "{\\*\\expandedcolortbl;;}\n"
+      "\\paperw11900\\paperh16840\\margl1440\\margr1440\\vieww11520\\viewh8400\\viewkind0\n"
+      "\\pard\\tx566\\pardirnatural\\partightenfactor0\n\n"
+      "\\f0\\fs24 \\cf0 Caf\\'e9 \\'80 \\uc0\\u8364 \\\n"
+      "{{\\NeXTGraphic Pasted Graphic.tiff \\width480 \\height320 \\appleattachmentpadding0 "
+      "\\appleembedtype0 \\appleaqc\n}\xac}\\\nnext\\'85}";
+  auto file = FileWrapper::initRegularFileWithContents(bytesOf("tiff bytes"));
+  auto bundle = FileWrapper::initDirectoryWithFileWrappers(
+      {{"TXT.rtf", FileWrapper::initRegularFileWithContents(bytesOf(rtf))},
+       {"Pasted Graphic.tiff", file}});
+  auto read = attributedStringWithRTFDFileWrapper(*bundle);
+  ASSERT_TRUE(read);
+  EXPECT_EQ(read->string(), u"Caf\u00e9 \u20ac \u20ac\n\uFFFC\nnext\u2026");
+  auto attachment = read->attachmentAtIndex(9);
+  ASSERT_TRUE(attachment);
+  EXPECT_EQ(attachment->fileWrapper(), file);
+  EXPECT_EQ(attachment->bounds(), Rect(0, 0, 24, 16));
+  EXPECT_FALSE(attachment->contents());
+}
+
+TEST(FileWrapper, SerialisedTreesRoundTripAndSkipMetadata) {
+  auto inner = FileWrapper::initDirectoryWithFileWrappers(
+      {{"deep.bin", FileWrapper::initRegularFileWithContents(Data(300, 0xAB))}});
+  auto tree = FileWrapper::initDirectoryWithFileWrappers(
+      {{"a.txt", FileWrapper::initRegularFileWithContents(bytesOf("A"))},
+       {"empty", FileWrapper::initRegularFileWithContents({})},
+       {"sub.rtfd", inner}});
+  auto back = FileWrapper::initWithSerializedRepresentation(tree->serializedRepresentation());
+  ASSERT_TRUE(back);
+  ASSERT_TRUE(back->isDirectory());
+  ASSERT_EQ(back->fileWrappers().size(), 3u);
+  EXPECT_EQ(back->fileWrappers().at("a.txt")->regularFileContents(), bytesOf("A"));
+  EXPECT_EQ(back->fileWrappers().at("a.txt")->filename(), "a.txt");
+  EXPECT_EQ(back->fileWrappers().at("empty")->regularFileContents(), Data{});
+  EXPECT_EQ(
+      back->fileWrappers().at("sub.rtfd")->fileWrappers().at("deep.bin")->regularFileContents(),
+      Data(300, 0xAB));
+
+  // A hand-made serialisation with the platform's metadata entry "." and a long-length
+  // file record: the metadata is skipped, the long form read.
+  Data flat = bytesOf("rtfd");
+  auto word = [&](std::uint32_t v) {
+    for (int i = 0; i < 4; ++i) flat.push_back(static_cast<std::uint8_t>(v >> (8 * i)));
+  };
+  word(0), word(3), word(2);
+  word(1), flat.push_back('.');
+  word(5), flat.insert(flat.end(), {'x', '.', 't', 'x', 't'});
+  word(8 + 1), word(20 + 2);
+  word(1), word(1), flat.push_back('m');
+  word(1), word(0x80000000u), word(2), word(4), flat.insert(flat.end(), {0, 0, 0, 0, 'h', 'i'});
+  auto parsed = FileWrapper::initWithSerializedRepresentation(flat);
+  ASSERT_TRUE(parsed);
+  ASSERT_EQ(parsed->fileWrappers().size(), 1u);
+  EXPECT_EQ(parsed->fileWrappers().at("x.txt")->regularFileContents(), bytesOf("hi"));
+}
+
+TEST(FileWrapper, ReadsFilesAndDirectoriesButNoLinks) {
+  testing::TempDir dir;
+  fs::create_directories(dir.file("pkg/inner"));
+  ASSERT_TRUE(writeFileAtomically(dir.file("pkg/a.txt"), bytesOf("a")));
+  ASSERT_TRUE(writeFileAtomically(dir.file("pkg/inner/b.txt"), bytesOf("b")));
+  ASSERT_TRUE(writeFileAtomically(dir.file("secret"), bytesOf("s")));
+  fs::create_symlink(dir.file("secret"), dir.file("pkg/link"));
+  auto pkg = FileWrapper::initWithPath(dir.file("pkg"));
+  ASSERT_TRUE(pkg);
+  EXPECT_EQ(pkg->filename(), "pkg");
+  EXPECT_EQ(pkg->fileWrappers().size(), 2u);  // the link is left out
+  EXPECT_EQ(pkg->fileWrappers().at("inner")->fileWrappers().at("b.txt")->regularFileContents(),
+            bytesOf("b"));
+  EXPECT_FALSE(FileWrapper::initWithPath(dir.file("pkg/link")));
+  EXPECT_FALSE(FileWrapper::initWithPath(dir.file("missing")));
+  // Writing a directory over an existing file replaces it whole.
+  ASSERT_TRUE(pkg->writeToPath(dir.file("secret")));
+  EXPECT_TRUE(fs::is_directory(dir.file("secret/inner")));
+  EXPECT_EQ(readFile(dir.file("secret/a.txt")), bytesOf("a"));
+}
+
+}  // namespace
+}  // namespace corvel

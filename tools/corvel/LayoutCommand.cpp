@@ -1,0 +1,223 @@
+// corvel layout FILE [--json | --tree]: our reading order for line boxes from any engine.
+//
+// FILE holds line blocks in the dictionary form: a JSON array of block dictionaries, or an
+// XML or binary property list whose root is such an array ("boundingBox" in the rectangle
+// text form "{{x, y}, {w, h}}", normalised, origin bottom-left). The blocks go to a layout
+// analyser in file order. Output: the reading-order text; with --json the analysed column
+// tree as a JSON array of block dictionaries; with --tree that tree as indented text.
+#include <cctype>
+#include <cstdio>
+#include <iostream>
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <string>
+
+#include "Commands.h"
+#include "Corvelbase/RVRecognitionBlock.h"
+#include "Corvelbase/RVTextLayoutAnalyser.h"
+#include "Corvelbase/platform/Files.h"
+
+namespace corvel::tool {
+
+namespace {
+
+using nlohmann::json;
+
+constexpr int kMaxNesting = 100;
+
+enum class Output { Text, Json, Tree };
+
+std::optional<PropertyList> propertyListFromJSON(const json& value, int depth, std::string& error) {
+  if (depth > kMaxNesting) {
+    error = "nested too deeply";
+    return std::nullopt;
+  }
+  switch (value.type()) {
+    case json::value_t::boolean:
+      return PropertyList(value.get<bool>());
+    case json::value_t::number_unsigned:
+      return PropertyList(value.get<std::uint64_t>());
+    case json::value_t::number_integer:
+      return PropertyList(value.get<std::int64_t>());
+    case json::value_t::number_float:
+      return PropertyList(value.get<double>());
+    case json::value_t::string:
+      return PropertyList(fromUTF8(value.get<std::string>()));
+    case json::value_t::array: {
+      PropertyList::Array array;
+      for (const json& element : value) {
+        auto converted = propertyListFromJSON(element, depth + 1, error);
+        if (!converted) return std::nullopt;
+        array.push_back(std::move(*converted));
+      }
+      return PropertyList(std::move(array));
+    }
+    case json::value_t::object: {
+      PropertyList::Dictionary dictionary;
+      for (const auto& [key, element] : value.items()) {
+        auto converted = propertyListFromJSON(element, depth + 1, error);
+        if (!converted) return std::nullopt;
+        dictionary[key] = std::move(*converted);
+      }
+      return PropertyList(std::move(dictionary));
+    }
+    default:  // null and binary: what a missing value reads as
+      return PropertyList();
+  }
+}
+
+json jsonFromPropertyList(const PropertyList& value) {
+  return std::visit(
+      [](const auto& v) -> json {
+        using T = std::decay_t<decltype(v)>;
+        if constexpr (std::is_same_v<T, String>) {
+          return toUTF8(v);
+        } else if constexpr (std::is_same_v<T, PropertyList::Array>) {
+          json array = json::array();
+          for (const auto& element : v) array.push_back(jsonFromPropertyList(element));
+          return array;
+        } else if constexpr (std::is_same_v<T, PropertyList::Dictionary>) {
+          json object = json::object();
+          for (const auto& [key, element] : v) object[key] = jsonFromPropertyList(element);
+          return object;
+        } else if constexpr (std::is_same_v<T, bool> || std::is_same_v<T, std::int64_t> ||
+                             std::is_same_v<T, std::uint64_t> || std::is_same_v<T, double>) {
+          return v;
+        } else {
+          return nullptr;  // block dictionaries hold nothing else
+        }
+      },
+      value.value());
+}
+
+// The file's array of block dictionaries, or nullopt with `error` set.
+std::optional<PropertyList::Array> readBlockArray(const std::string& path, std::string& error) {
+  std::optional<Data> bytes = readFile(path);
+  if (!bytes) {
+    error = "cannot read '" + path + "'";
+    return std::nullopt;
+  }
+  std::optional<PropertyList> root;
+  std::size_t first = 0;
+  while (first < bytes->size() && std::isspace((*bytes)[first])) ++first;
+  if (first < bytes->size() && ((*bytes)[first] == '[' || (*bytes)[first] == '{')) {
+    json parsed = json::parse(bytes->begin(), bytes->end(), nullptr, false);
+    if (parsed.is_discarded()) {
+      error = "'" + path + "' is not valid JSON";
+      return std::nullopt;
+    }
+    std::string why;
+    root = propertyListFromJSON(parsed, 0, why);
+    if (!root) {
+      error = "'" + path + "': " + why;
+      return std::nullopt;
+    }
+  } else {
+    root = PropertyList::deserialize(*bytes);
+    if (!root) {
+      error = "'" + path + "' is neither JSON nor a property list";
+      return std::nullopt;
+    }
+  }
+  if (!root->array()) {
+    error = "'" + path + "' must hold an array of block dictionaries";
+    return std::nullopt;
+  }
+  for (std::size_t i = 0; i < root->array()->size(); ++i) {
+    if (!(*root->array())[i].dictionary()) {
+      error = "'" + path + "': element " + std::to_string(i) + " is not a block dictionary";
+      return std::nullopt;
+    }
+  }
+  return std::move(*root->array());
+}
+
+const char* levelName(RVRecognitionBlockLevel level) {
+  switch (level) {
+    case RVRecognitionBlockLevelColumn:
+      return "column";
+    case RVRecognitionBlockLevelParagraph:
+      return "paragraph";
+    case RVRecognitionBlockLevelLine:
+      return "line";
+  }
+  return "block";
+}
+
+// Boxes rounded for reading; --json gives the exact values.
+std::string roundedRect(const Rect& r) {
+  char text[128];
+  std::snprintf(text, sizeof text, "{{%.4g, %.4g}, {%.4g, %.4g}}", r.origin.x, r.origin.y,
+                r.size.width, r.size.height);
+  return text;
+}
+
+void printTree(const RVBlockArray& blocks, int depth, std::ostream& out) {
+  if (depth > RVRecognitionBlock::kMaxTreeDepth) return;
+  std::size_t number = 0;
+  for (const auto& block : blocks) {
+    if (!block) continue;
+    out << std::string(2 * depth, ' ');
+    if (block->children().empty()) {
+      out << toUTF8(block->description()) << '\n';
+      continue;
+    }
+    out << levelName(block->level()) << ' ' << ++number << ' ' << roundedRect(block->boundingBox())
+        << '\n';
+    printTree(block->children(), depth + 1, out);
+  }
+}
+
+int run(const Arguments& args) {
+  Output output = Output::Text;
+  std::optional<std::string> path;
+  for (const std::string& arg : args) {
+    if (arg == "--json") {
+      output = Output::Json;
+    } else if (arg == "--tree") {
+      output = Output::Tree;
+    } else if (!arg.empty() && arg[0] == '-') {
+      return misuse("layout: unknown option '" + arg + "'");
+    } else if (path) {
+      return misuse("layout: one file at a time");
+    } else {
+      path = arg;
+    }
+  }
+  if (!path) return misuse("layout: no file given (corvel layout FILE [--json | --tree])");
+  std::string error;
+  std::optional<PropertyList::Array> infos = readBlockArray(*path, error);
+  if (!infos) return misuse("layout: " + error);
+
+  auto analyser = RVTextLayoutAnalyser::init();
+  for (const PropertyList& info : *infos)
+    analyser->addRecognitionBlock(RVRecognitionBlock::createBlockFromInfo(info));
+  analyser->analyse(Size{1, 1}, RVWritingDirectionHorizontal);
+
+  switch (output) {
+    case Output::Text:
+      std::cout << toUTF8(analyser->text()) << '\n';
+      break;
+    case Output::Json: {
+      json columns = json::array();
+      for (const auto& column : *analyser->layoutBlocks())
+        columns.push_back(jsonFromPropertyList(column->blockInformation()));
+      std::cout << columns.dump(2) << '\n';
+      break;
+    }
+    case Output::Tree:
+      printTree(*analyser->layoutBlocks(), 0, std::cout);
+      break;
+  }
+  return 0;
+}
+
+CommandRegistration reg("layout",
+                        "layout FILE [--json | --tree] : reading-order text of line blocks "
+                        "(JSON array or plist of block dictionaries); --json prints the column "
+                        "tree as block dictionaries, --tree as indented text",
+                        &run);
+
+}  // namespace
+
+}  // namespace corvel::tool
