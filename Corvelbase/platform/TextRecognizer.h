@@ -192,8 +192,10 @@ class CORVEL_EXPORT TesseractRecognizer final : public TextRecognizer {
   struct Statistics {
     std::uint64_t recognitions = 0;    // engine passes over an image (detection included)
     double recognitionSeconds = 0;     // wall time inside the engine, summed over threads
+    double recognitionCpuSeconds = 0;  // CPU time of the threads inside the engine
     std::uint64_t enginesStarted = 0;  // engines initialised (a pool miss each)
     double engineStartSeconds = 0;
+    double engineStartCpuSeconds = 0;
     std::size_t idleEngines = 0;
   };
 
