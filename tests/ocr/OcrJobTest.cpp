@@ -198,7 +198,7 @@ TEST_F(OcrJob, EveryBadImageEndsInAnErrorSayingWhatWentWrong) {
   Data corrupt = png;
   for (std::size_t i = 100; i < corrupt.size(); ++i) corrupt[i] = static_cast<std::uint8_t>(i);
   Data noPixels = png;  // a PNG header claiming 0 x 0 pixels
-  std::fill(noPixels.begin() + 16, noPixels.begin() + 24, 0);
+  for (std::size_t i = 16; i < 24 && i < noPixels.size(); ++i) noPixels[i] = 0;
   Data huge = png;  // and one claiming 30000 x 30000
   huge[16] = 0, huge[17] = 0, huge[18] = 0x75, huge[19] = 0x30;
   huge[20] = 0, huge[21] = 0, huge[22] = 0x75, huge[23] = 0x30;
