@@ -19,6 +19,7 @@
 // precision when read back from the dictionary form.
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -114,7 +115,8 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
   // children) instead of the constant-time one; read through children() where a view is
   // enough.
   const std::shared_ptr<RVBlockArray>& childBlocks() const {
-    childrenShared_ = true;
+    if (!childrenShared_.load(std::memory_order_relaxed))
+      childrenShared_.store(true, std::memory_order_relaxed);
     return childBlocks_;
   }
   // The children, read-only.
@@ -267,8 +269,8 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
   RVBlockMatchType matchType_ = RVBlockMatchNone;
   double lineSpacing_ = 0;
   Rect boundingBox_;
-  mutable std::optional<std::uint64_t> textHash_;
-  mutable bool childrenShared_ = false;
+  std::uint64_t textHash_ = 0;  // kept with the text, so hash() only reads
+  mutable std::atomic<bool> childrenShared_{false};
   std::unique_ptr<AssemblyCache> cache_;
   std::vector<std::weak_ptr<RVRecognitionBlock>> watchers_;
 };

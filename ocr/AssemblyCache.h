@@ -3,6 +3,8 @@
 
 #include <cstdint>
 #include <limits>
+#include <optional>
+#include <string_view>
 #include <unordered_set>
 
 #include "Corvelbase/RVRecognitionBlock.h"
@@ -19,5 +21,20 @@ struct RVRecognitionBlock::AssemblyCache {
   double minBottom = std::numeric_limits<double>::infinity();
   std::unordered_set<std::uint64_t> hashes;
 };
+
+// FNV-1a over UTF-16 units. Its state is its value, so the hash of a text that grows at
+// its end is carried on from the hash of what it was.
+inline constexpr std::uint64_t kTextHashSeed = 14695981039346656037ull;
+inline std::uint64_t continueTextHash(std::uint64_t hash, std::u16string_view units) {
+  for (char16_t unit : units) {
+    hash ^= static_cast<std::uint64_t>(unit);
+    hash *= 1099511628211ull;
+  }
+  return hash;
+}
+// 0 for a nil text.
+inline std::uint64_t textHash(const std::optional<String>& text) {
+  return text ? continueTextHash(kTextHashSeed, *text) : 0;
+}
 
 }  // namespace corvel

@@ -33,17 +33,6 @@ std::shared_ptr<RVBlockArray> newChildArray() {
   return array;
 }
 
-// FNV-1a over the UTF-16 units: deterministic across runs and platforms.
-std::uint64_t textHash(const std::optional<String>& text) {
-  if (!text) return 0;
-  std::uint64_t h = 14695981039346656037ull;
-  for (char16_t unit : *text) {
-    h ^= static_cast<std::uint64_t>(unit);
-    h *= 1099511628211ull;
-  }
-  return h;
-}
-
 // Truncation to unsigned 64 bits, saturating where a plain cast would be undefined.
 std::uint64_t truncateToUnsigned(double value) {
   if (!(value > 0)) return 0;  // also NaN
@@ -103,7 +92,8 @@ RVRecognitionBlock::RVRecognitionBlock(std::optional<String> text, Rect bounding
       childBlocks_(newChildArray()),
       matchType_(RVBlockMatchNone),
       lineSpacing_(spacingUndefined),
-      boundingBox_(boundingBox) {}
+      boundingBox_(boundingBox),
+      textHash_(textHash(text_)) {}
 
 RVRecognitionBlock::~RVRecognitionBlock() = default;
 
@@ -134,7 +124,7 @@ std::shared_ptr<RVRecognitionBlock> RVRecognitionBlock::initParagraphWithBlock(
 
 void RVRecognitionBlock::setChildBlocks(std::shared_ptr<RVBlockArray> childBlocks) {
   // The caller keeps the array it gave us, so it is shared from now on.
-  childrenShared_ = true;
+  childrenShared_.store(true, std::memory_order_relaxed);
   invalidateCache();
   childBlocks_ = childBlocks ? std::move(childBlocks) : newChildArray();
 }
@@ -162,9 +152,8 @@ double RVRecognitionBlock::lineSpacingForHeight(double height) const {
 std::shared_ptr<RVRecognitionBlock> RVRecognitionBlock::copy() { return shared_from_this(); }
 
 std::uint64_t RVRecognitionBlock::hash() const {
-  if (!textHash_) textHash_ = textHash(text_);
   return static_cast<std::uint64_t>(level_) + truncateToUnsigned(confidence_ * 10000.0) * 11813u +
-         *textHash_ * 13411u;
+         textHash_ * 13411u;
 }
 
 bool RVRecognitionBlock::isEqual(const std::shared_ptr<RVRecognitionBlock>& other) const {

@@ -60,7 +60,7 @@ void RVRecognitionBlock::rebuildText() { setText(buildTextString()); }
 
 void RVRecognitionBlock::setText(std::optional<String> text) {
   text_ = std::move(text);
-  textHash_.reset();
+  textHash_ = textHash(text_);
   invalidateCache();
   changed();
 }
@@ -116,11 +116,14 @@ bool RVRecognitionBlock::appendBelowAll(const std::shared_ptr<RVRecognitionBlock
   double bottom = rectGetMinY(block->boundingBox_);
   if (cache_->minBottom < bottom) return false;  // some child lies lower: goes in between
   childBlocks_->push_back(block);
-  String text = std::move(*text_);
-  if (block->matchType_ == RVBlockMatchSameColumn) text.push_back(u'\n');
-  if (block->text_) text.append(*block->text_);
-  text_ = std::move(text);
-  textHash_.reset();
+  if (block->matchType_ == RVBlockMatchSameColumn) {
+    text_->push_back(u'\n');
+    textHash_ = continueTextHash(textHash_, u"\n");
+  }
+  if (block->text_) {
+    text_->append(*block->text_);
+    textHash_ = continueTextHash(textHash_, *block->text_);
+  }
   boundingBox_ = rectUnion(boundingBox_, block->boundingBox_);
   cache_->hashes.insert(hash);
   if (!std::isnan(bottom)) cache_->minBottom = std::min(cache_->minBottom, bottom);

@@ -13,7 +13,6 @@ namespace {
 
 using testing::line;
 using testing::text;
-using testing::TunableGuard;
 
 std::shared_ptr<RVTextLayoutAnalyser> analysed(const RVBlockArray& lines) {
   auto analyser = RVTextLayoutAnalyser::init();
@@ -81,35 +80,7 @@ TEST(LayoutDriver, JoiningLooksAtTheTextSoFar) {
   }
 }
 
-TEST(LayoutDriver, SizeAndDirectionChangeNothing) {
-  RVBlockArray page = {line("a", 0.1, 0.8, 0.3, 0.02), line("b", 0.6, 0.8, 0.3, 0.02),
-                       line("c", 0.1, 0.777, 0.3, 0.02)};
-  auto first = analysed(page);
-  auto second = RVTextLayoutAnalyser::init();
-  second->addRecognitionBlocks(page);
-  second->analyse(Size{1, 7}, RVWritingDirectionVertical);
-  EXPECT_EQ(treeOf(*first), treeOf(*second));
-  EXPECT_EQ(first->text(), second->text());
-}
-
 // ---- Columns.
-
-TEST(LayoutColumns, LeftEdgesWithinTheAllowanceShareAColumn) {
-  EXPECT_EQ(analysed({line("a", 0.10, 0.8, 0.3, 0.02), line("b", 0.11, 0.7, 0.3, 0.02)})
-                ->layoutBlocks()
-                ->size(),
-            1u);
-  EXPECT_EQ(analysed({line("a", 0.10, 0.8, 0.3, 0.02), line("b", 0.115, 0.7, 0.3, 0.02)})
-                ->layoutBlocks()
-                ->size(),
-            2u);
-  TunableGuard guard(columnMatchAllowance);
-  columnMatchAllowance = 0.03;
-  EXPECT_EQ(analysed({line("a", 0.10, 0.8, 0.3, 0.02), line("b", 0.115, 0.7, 0.3, 0.02)})
-                ->layoutBlocks()
-                ->size(),
-            1u);
-}
 
 TEST(LayoutColumns, NewColumnsGoBeforeTheFirstColumnWhollyToTheirRight) {
   auto analyser = RVTextLayoutAnalyser::init();
