@@ -26,9 +26,7 @@ bench: build
 	  [ -x "$$b" ] || continue; echo "== $$b"; "$$b" || exit 1; done
 
 demo: build
-	$(RELEASE_DIR)/tools/corvel/corvel layout tests/fixtures/layout/article.json
-	@echo
-	$(RELEASE_DIR)/tools/corvel/corvel layout --tree tests/fixtures/layout/article.json
+	$(RELEASE_DIR)/tools/corvel/corvel ocr tests/fixtures/ocr/sample.png
 
 format:
 	git ls-files '*.h' '*.cpp' | xargs clang-format -i

@@ -97,5 +97,7 @@ class CORVEL_EXPORT Image {
 
 // JPEG bytes of a bitmap at a compression factor in 0...1; nullopt on failure.
 CORVEL_EXPORT std::optional<Data> jpegDataForBitmap(const Bitmap& bitmap, double compressionFactor);
+// PNG bytes of a bitmap (lossless, alpha kept); nullopt on failure.
+CORVEL_EXPORT std::optional<Data> pngDataForBitmap(const Bitmap& bitmap);
 
 }  // namespace corvel

@@ -1,0 +1,324 @@
+// bench_ocr: our OCR batch through the shared queue against the `tesseract` command run
+// the best way it can be (two processes at a time, OMP_THREAD_LIMIT=1, the same
+// language), on the same images in the same run.
+//
+// Sets: the full pages tests/fixtures/ocr/pages/page-*.png (A4 at 300 dpi, one and two
+// columns) and the single lines tests/fixtures/ocr/lines/line-*.png cut from them.
+// For each set and level (accurate, fast) it prints images per minute of ours and of
+// the command and their ratio, the character error rate of both against the pages'
+// source, and the share of our process's CPU time spent outside the engine's
+// recognition (decoding, conversion, layout analysis, text, queueing; engine start-up
+// is shown apart). At the end: peak memory of our process and of the largest command.
+//
+// Usage: bench_ocr [--pages N] [--lines N] [--fast-cap PIXELS]
+//   (defaults: all pages, all lines, the recogniser's own cap for the fast level)
+// The command runs once next to each of our levels, just before it.
+// The command must be on PATH (Debian's tesseract-ocr); without it only ours is timed.
+#include <spawn.h>
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <fcntl.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "Corvelbase/RVVisionOCR.h"
+#include "Corvelbase/platform/OperationQueue.h"
+#include "Corvelbase/platform/Platform.h"
+#include "Corvelbase/platform/TextRecognizer.h"
+
+extern char** environ;
+
+namespace {
+
+using namespace corvel;
+namespace fs = std::filesystem;
+
+constexpr int kCommandProcesses = 2;
+
+struct Sample {
+  std::string image;
+  std::string expected;  // source text, for the error rate
+};
+
+std::string readText(const fs::path& path) {
+  std::ifstream in(path);
+  std::stringstream text;
+  text << in.rdbuf();
+  return text.str();
+}
+
+std::vector<Sample> pages(std::size_t limit) {
+  std::vector<Sample> out;
+  fs::path dir = fs::path(CORVEL_FIXTURES_DIR) / "ocr" / "pages";
+  for (std::size_t i = 1; out.size() < limit; ++i) {
+    char name[32];
+    std::snprintf(name, sizeof name, "page-%02zu", i);
+    if (!fs::exists(dir / (std::string(name) + ".png"))) break;
+    out.push_back({(dir / (std::string(name) + ".png")).string(),
+                   readText(dir / (std::string(name) + ".txt"))});
+  }
+  return out;
+}
+
+std::vector<Sample> lines(std::size_t limit) {
+  std::vector<Sample> out;
+  fs::path dir = fs::path(CORVEL_FIXTURES_DIR) / "ocr" / "lines";
+  std::ifstream texts(dir / "lines.txt");
+  std::string text;
+  for (std::size_t i = 1; out.size() < limit && std::getline(texts, text); ++i) {
+    char name[32];
+    std::snprintf(name, sizeof name, "line-%03zu.png", i);
+    out.push_back({(dir / name).string(), text});
+  }
+  return out;
+}
+
+// Edit distance over code points after collapsing white space, divided by the
+// expected length.
+double errorRate(const std::vector<std::string>& expected, const std::vector<std::string>& got) {
+  auto normal = [](const std::string& utf8) {
+    std::u32string out;
+    String s = fromUTF8(utf8);
+    bool space = false;
+    for (char16_t c : s) {
+      if (c == u' ' || c == u'\n' || c == u'\t' || c == u'\r' || c == u'\f') {
+        space = !out.empty();
+        continue;
+      }
+      if (space) out += U' ';
+      space = false;
+      out += c;
+    }
+    return out;
+  };
+  double errors = 0, length = 0;
+  for (std::size_t k = 0; k < expected.size(); ++k) {
+    std::u32string a = normal(expected[k]), b = normal(k < got.size() ? got[k] : "");
+    std::vector<std::size_t> row(b.size() + 1);
+    for (std::size_t j = 0; j <= b.size(); ++j) row[j] = j;
+    for (std::size_t i = 1; i <= a.size(); ++i) {
+      std::size_t diagonal = row[0];
+      row[0] = i;
+      for (std::size_t j = 1; j <= b.size(); ++j) {
+        std::size_t up = row[j];
+        row[j] = std::min({row[j] + 1, row[j - 1] + 1, diagonal + (a[i - 1] == b[j - 1] ? 0 : 1)});
+        diagonal = up;
+      }
+    }
+    errors += static_cast<double>(row[b.size()]);
+    length += static_cast<double>(a.size());
+  }
+  return length > 0 ? errors / length : 0;
+}
+
+double processCpuSeconds() {
+  rusage usage{};
+  getrusage(RUSAGE_SELF, &usage);
+  auto seconds = [](const timeval& t) { return t.tv_sec + t.tv_usec * 1e-6; };
+  return seconds(usage.ru_utime) + seconds(usage.ru_stime);
+}
+
+double since(std::chrono::steady_clock::time_point start) {
+  return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+}
+
+struct Run {
+  double seconds = 0;
+  std::vector<std::string> texts;
+  int failures = 0;
+  double ownShare = -1;       // of process CPU outside recognition, start-up excluded
+  double startupSeconds = 0;  // engine start-up within this run
+};
+
+// Our batch: every image queued at once, completions drained on this thread.
+Run runOurs(const std::vector<Sample>& samples, bool fast, TesseractRecognizer& recognizer) {
+  Run run;
+  run.texts.resize(samples.size());
+  std::vector<char> done(samples.size(), 0);
+  auto before = recognizer.statistics();
+  double cpuBefore = processCpuSeconds();
+  auto start = std::chrono::steady_clock::now();
+  for (std::size_t i = 0; i < samples.size(); ++i) {
+    RVVisionOCR::ocrImageAtPath(fromUTF8(samples[i].image), {"en-US"}, fast,
+                                [&, i](const String& text, const std::optional<Error>& error) {
+                                  run.texts[i] = toUTF8(text);
+                                  if (error) ++run.failures;
+                                  done[i] = 1;
+                                });
+  }
+  MainQueue::runUntil(
+      [&] { return std::all_of(done.begin(), done.end(), [](char d) { return d; }); });
+  run.seconds = since(start);
+  double cpu = processCpuSeconds() - cpuBefore;
+  auto after = recognizer.statistics();
+  double engine = after.recognitionCpuSeconds - before.recognitionCpuSeconds;
+  run.startupSeconds = after.engineStartCpuSeconds - before.engineStartCpuSeconds;
+  double ours = cpu - engine - run.startupSeconds;
+  run.ownShare = cpu > 0 ? std::max(0.0, ours) / (cpu - run.startupSeconds) : 0;
+  return run;
+}
+
+bool commandAvailable() { return std::system("command -v tesseract >/dev/null 2>&1") == 0; }
+
+// The command on every image, kCommandProcesses at a time, each reading its image and
+// writing its text to a file.
+Run runCommand(const std::vector<Sample>& samples, const fs::path& work) {
+  Run run;
+  run.texts.resize(samples.size());
+  std::vector<std::string> env;
+  for (char** e = environ; *e; ++e) {
+    if (std::string(*e).rfind("OMP_THREAD_LIMIT=", 0) != 0) env.emplace_back(*e);
+  }
+  env.emplace_back("OMP_THREAD_LIMIT=1");
+  std::vector<char*> envp;
+  for (auto& e : env) envp.push_back(e.data());
+  envp.push_back(nullptr);
+  posix_spawn_file_actions_t quiet;
+  posix_spawn_file_actions_init(&quiet);
+  posix_spawn_file_actions_addopen(&quiet, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
+  posix_spawn_file_actions_addopen(&quiet, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
+
+  auto start = std::chrono::steady_clock::now();
+  std::size_t next = 0, running = 0;
+  auto outBase = [&](std::size_t i) { return (work / ("out-" + std::to_string(i))).string(); };
+  while (next < samples.size() || running > 0) {
+    while (running < kCommandProcesses && next < samples.size()) {
+      std::vector<std::string> args{"tesseract", samples[next].image, outBase(next), "-l", "eng"};
+      std::vector<char*> argv;
+      for (auto& a : args) argv.push_back(a.data());
+      argv.push_back(nullptr);
+      pid_t pid = 0;
+      if (posix_spawnp(&pid, "tesseract", &quiet, nullptr, argv.data(), envp.data()) == 0) {
+        ++running;
+      } else {
+        ++run.failures;
+      }
+      ++next;
+    }
+    int status = 0;
+    if (running > 0 && wait(&status) > 0) {
+      --running;
+      if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) ++run.failures;
+    }
+  }
+  run.seconds = since(start);
+  posix_spawn_file_actions_destroy(&quiet);
+  for (std::size_t i = 0; i < samples.size(); ++i) run.texts[i] = readText(outBase(i) + ".txt");
+  return run;
+}
+
+// Peak resident memory of one command on `sample`, in MiB. Measured before this process
+// has grown: a spawned child's peak starts from its parent's at the time of spawning.
+double commandPeakMiB(const Sample& sample, const fs::path& work) {
+  std::string out = (work / "peak").string();
+  std::vector<std::string> args{"tesseract", sample.image, out, "-l", "eng"};
+  std::vector<char*> argv;
+  for (auto& a : args) argv.push_back(a.data());
+  argv.push_back(nullptr);
+  posix_spawn_file_actions_t quiet;
+  posix_spawn_file_actions_init(&quiet);
+  posix_spawn_file_actions_addopen(&quiet, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
+  posix_spawn_file_actions_addopen(&quiet, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
+  pid_t pid = 0;
+  double peak = -1;
+  if (posix_spawnp(&pid, "tesseract", &quiet, nullptr, argv.data(), environ) == 0) {
+    int status = 0;
+    rusage usage{};
+    if (wait4(pid, &status, 0, &usage) == pid) peak = usage.ru_maxrss / 1024.0;
+  }
+  posix_spawn_file_actions_destroy(&quiet);
+  return peak;
+}
+
+void report(const char* set, const char* level, const std::vector<Sample>& samples, const Run& ours,
+            const Run* command) {
+  std::vector<std::string> expected;
+  for (const auto& s : samples) expected.push_back(s.expected);
+  double perMinute = 60.0 * static_cast<double>(samples.size()) / ours.seconds;
+  std::printf(
+      "%-6s %-8s ours %7.1f/min  error %5.2f%%  own CPU share %5.2f%% (engine start %.2f s CPU)",
+      set, level, perMinute, 100 * errorRate(expected, ours.texts), 100 * ours.ownShare,
+      ours.startupSeconds);
+  if (command) {
+    double commandPerMinute = 60.0 * static_cast<double>(samples.size()) / command->seconds;
+    std::printf(" | command %7.1f/min  error %5.2f%% | ratio %.2fx", commandPerMinute,
+                100 * errorRate(expected, command->texts), perMinute / commandPerMinute);
+  }
+  if (ours.failures || (command && command->failures)) {
+    std::printf("  [failures: ours %d, command %d]", ours.failures,
+                command ? command->failures : 0);
+  }
+  std::printf("\n");
+  std::fflush(stdout);
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  std::size_t pageLimit = 1000, lineLimit = 1000;
+  TesseractRecognizer::Options options;
+  for (int i = 1; i + 1 < argc; i += 2) {
+    std::string flag = argv[i];
+    std::size_t value = std::strtoul(argv[i + 1], nullptr, 10);
+    if (flag == "--pages") pageLimit = value;
+    if (flag == "--lines") lineLimit = value;
+    if (flag == "--fast-cap") options.fastMaxLongSide = static_cast<std::uint32_t>(value);
+  }
+  auto recognizer = TesseractRecognizer::init(options);
+  if (!recognizer->isAvailable()) {
+    std::fprintf(stderr, "bench_ocr: no Tesseract language data installed\n");
+    return 1;
+  }
+  PlatformRegistry::setTextRecognizer(recognizer);
+  RVVisionOCR::ocrQueue();  // made on the main thread, as hosts do
+
+  bool command = commandAvailable();
+  fs::path work = fs::temp_directory_path() / ("bench_ocr." + std::to_string(getpid()));
+  fs::create_directories(work);
+  std::printf("bench_ocr: %u cores; command: %s\n", std::thread::hardware_concurrency(),
+              command ? "tesseract, 2 processes, OMP_THREAD_LIMIT=1, -l eng" : "not found");
+
+  struct Set {
+    const char* name;
+    std::vector<Sample> samples;
+  } sets[] = {{"pages", pages(pageLimit)}, {"lines", lines(lineLimit)}};
+  double commandPeak =
+      command && !sets[0].samples.empty() ? commandPeakMiB(sets[0].samples[0], work) : -1;
+  double accurateSeconds = 0, fastSeconds = 0;
+  for (const auto& set : sets) {
+    if (set.samples.empty()) continue;
+    std::printf("%s: %zu images\n", set.name, set.samples.size());
+    for (bool fast : {false, true}) {
+      // The command has one speed; it runs again next to each of our levels, so both
+      // sides of a ratio see the same load on the machine.
+      Run reference;
+      if (command) reference = runCommand(set.samples, work);
+      Run ours = runOurs(set.samples, fast, *recognizer);
+      report(set.name, fast ? "fast" : "accurate", set.samples, ours,
+             command ? &reference : nullptr);
+      if (std::string(set.name) == "pages") (fast ? fastSeconds : accurateSeconds) = ours.seconds;
+    }
+  }
+  if (fastSeconds > 0)
+    std::printf("pages: fast is %.2fx the speed of accurate\n", accurateSeconds / fastSeconds);
+
+  rusage self{};
+  getrusage(RUSAGE_SELF, &self);
+  std::printf(
+      "peak memory: ours %.0f MiB (the whole process, engines for 2 recognitions at once"
+      " and up to 6 jobs' pages); one command %.0f MiB (on the first page)\n",
+      self.ru_maxrss / 1024.0, commandPeak);
+  fs::remove_all(work);
+  return 0;
+}

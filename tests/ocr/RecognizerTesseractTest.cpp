@@ -1,0 +1,244 @@
+// The Tesseract recogniser behind requests: observations, levels, orientation, language
+// data, the engine pool and its failures.
+#include <gtest/gtest.h>
+
+#include <filesystem>
+
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/Platform.h"
+#include "Corvelbase/platform/TextRecognizer.h"
+#include "OcrTestText.h"
+#include "support/TestSupport.h"
+
+namespace corvel {
+namespace {
+
+constexpr const char* kDataPath = "/usr/share/tesseract-ocr/5/tessdata";
+
+struct Outcome {
+  std::optional<std::vector<RecognizedTextObservation>> results;
+  std::optional<Error> error;
+  int handlerCalls = 0;
+
+  std::string text() const {
+    std::string out;
+    if (results)
+      for (const auto& o : *results) out += toUTF8(o.candidates.at(0).string) + "\n";
+    return out;
+  }
+};
+
+Outcome perform(std::shared_ptr<ImageRequestHandler> handler, std::int64_t level,
+                std::vector<std::string> languages, bool detect = false) {
+  Outcome outcome;
+  auto request = TextRecognitionRequest::initWithCompletionHandler(
+      [&](TextRecognitionRequest& r, const std::optional<Error>& error) {
+        ++outcome.handlerCalls;
+        outcome.results = r.results();
+        outcome.error = error;
+      });
+  request->setRecognitionLevel(level);
+  request->setRecognitionLanguages(std::move(languages));
+  request->setAutomaticallyDetectsLanguage(detect);
+  Error error;
+  bool ok = handler->performRequests({request}, &error);
+  EXPECT_EQ(ok, !outcome.error.has_value());
+  if (!ok && outcome.error) {
+    EXPECT_EQ(error, *outcome.error);
+  }
+  return outcome;
+}
+
+std::shared_ptr<ImageRequestHandler> fixture(const std::string& name) {
+  return ImageRequestHandler::initWithImage(
+      Image::initByReferencingFile(testing::fixturePath("ocr/" + name + ".png")), {});
+}
+
+// The page turned a quarter anticlockwise, as a phone photo held sideways comes out.
+std::shared_ptr<Bitmap> turnedQuarter(const Bitmap& page) {
+  Data rgba = page.rgba();
+  std::uint32_t w = page.width(), h = page.height();
+  Data turned(rgba.size());
+  for (std::uint32_t y = 0; y < h; ++y) {
+    for (std::uint32_t x = 0; x < w; ++x) {
+      // (x, y) goes to (y, w - 1 - x) in an image h wide and w high.
+      std::size_t from = (static_cast<std::size_t>(y) * w + x) * 4;
+      std::size_t to = (static_cast<std::size_t>(w - 1 - x) * h + y) * 4;
+      std::copy_n(&rgba[from], 4, &turned[to]);
+    }
+  }
+  return Bitmap::fromRGBA(h, w, turned.data(), turned.size());
+}
+
+class TesseractRecognition : public ::testing::Test {
+ protected:
+  static void SetUpTestSuite() { recognizer_ = TesseractRecognizer::init(); }
+  static void TearDownTestSuite() { recognizer_.reset(); }
+  void SetUp() override { PlatformRegistry::setTextRecognizer(recognizer_); }
+  void TearDown() override { PlatformRegistry::setTextRecognizer(nullptr); }
+  static std::shared_ptr<TesseractRecognizer> recognizer_;
+};
+std::shared_ptr<TesseractRecognizer> TesseractRecognition::recognizer_;
+
+TEST_F(TesseractRecognition, LinesBecomeObservationsNormalisedFromTheBottomLeft) {
+  auto outcome = perform(fixture("two-columns"), TextRecognitionLevelFast, {"en-US"});
+  ASSERT_FALSE(outcome.error) << outcome.error->description();
+  ASSERT_TRUE(outcome.results);
+  ASSERT_GE(outcome.results->size(), 13u);
+  EXPECT_LT(testing::characterErrorRate(testing::fixtureText("two-columns"), outcome.text()), 0.03)
+      << outcome.text();
+  // The render script draws the heading at (103, 103) on the 1240 x 1000 page, 35 pixels
+  // high: its box starts near x 0.083 and its top edge near y 1 - 0.103.
+  const auto& heading = outcome.results->front();
+  EXPECT_EQ(toUTF8(heading.candidates.at(0).string), "Notes from the Reading Room");
+  EXPECT_NEAR(heading.boundingBox.origin.x, 103.0 / 1240, 0.005);
+  EXPECT_NEAR(heading.boundingBox.origin.y + heading.boundingBox.size.height, 1 - 103.0 / 1000,
+              0.015);
+  for (const auto& observation : *outcome.results) {
+    const Rect& box = observation.boundingBox;
+    EXPECT_GE(box.origin.x, 0);
+    EXPECT_GE(box.origin.y, 0);
+    EXPECT_LE(box.origin.x + box.size.width, 1);
+    EXPECT_LE(box.origin.y + box.size.height, 1);
+    EXPECT_GT(box.size.height, 0);
+    // Both columns' lines lie below the heading and on their side of the gutter.
+    if (&observation != &outcome.results->front()) {
+      EXPECT_LT(box.origin.y, heading.boundingBox.origin.y);
+      EXPECT_TRUE(box.origin.x + box.size.width < 0.5 || box.origin.x > 0.5);
+    }
+    ASSERT_EQ(observation.candidates.size(), 1u);
+    EXPECT_GT(observation.candidates[0].confidence, 0.5f);
+    EXPECT_LE(observation.candidates[0].confidence, 1.0f);
+  }
+}
+
+TEST_F(TesseractRecognition, AccurateTurnsAPageOnItsSideUpright) {
+  auto page = Image::initByReferencingFile(testing::fixturePath("ocr/two-columns.png"))->bitmap();
+  ASSERT_TRUE(page);
+  auto turned = turnedQuarter(*page);
+  ASSERT_TRUE(turned);
+  auto outcome = perform(ImageRequestHandler::initWithCGImage(turned, {}),
+                         TextRecognitionLevelAccurate, {"en-US"});
+  ASSERT_FALSE(outcome.error);
+  EXPECT_LT(testing::characterErrorRate(testing::fixtureText("two-columns"), outcome.text()), 0.03)
+      << outcome.text();
+}
+
+TEST_F(TesseractRecognition, UnevenlyLitPhotographKeepsEveryLine) {
+  auto outcome = perform(fixture("photographed"), TextRecognitionLevelFast, {"en-US"});
+  ASSERT_FALSE(outcome.error);
+  EXPECT_LT(testing::characterErrorRate(testing::fixtureText("photographed"), outcome.text()), 0.05)
+      << outcome.text();
+}
+
+TEST_F(TesseractRecognition, EnginesAreStartedOnceAndReused) {
+  auto before = recognizer_->statistics();
+  auto line = Image::initByReferencingFile(testing::fixturePath("ocr/lines/line-001.png"));
+  for (int i = 0; i < 3; ++i) {
+    auto outcome =
+        perform(ImageRequestHandler::initWithImage(line, {}), TextRecognitionLevelFast, {"de-DE"});
+    ASSERT_FALSE(outcome.error);
+    ASSERT_EQ(outcome.results->size(), 1u);
+  }
+  auto after = recognizer_->statistics();
+  EXPECT_EQ(after.enginesStarted - before.enginesStarted, 1u);
+  EXPECT_EQ(after.recognitions - before.recognitions, 3u);
+  EXPECT_GT(after.recognitionSeconds, before.recognitionSeconds);
+}
+
+TEST_F(TesseractRecognition, CodesWithoutAModelFailBeforeAnyRecognition) {
+  for (const char* code : {"xx-XX", "", "en"}) {
+    auto outcome = perform(fixture("french"), TextRecognitionLevelFast, {"fr-FR", code});
+    ASSERT_TRUE(outcome.error) << code;
+    EXPECT_EQ(outcome.handlerCalls, 1);
+    EXPECT_EQ(outcome.error->domain, TextRecognitionErrorDomain);
+    EXPECT_EQ(outcome.error->code, TextRecognitionErrorUnsupportedLanguage);
+    EXPECT_NE(outcome.error->userInfoString("Error reason").find("\"" + std::string(code) + "\""),
+              std::string::npos);
+    EXPECT_FALSE(outcome.results);
+  }
+}
+
+TEST(TesseractLanguageData, SupportedLanguagesAreTheInstalledOnesInOurOrder) {
+  auto all = TesseractRecognizer::init();
+  Error error;
+  auto codes = all->supportedRecognitionLanguages(0, 3, &error);
+  ASSERT_TRUE(codes);
+  EXPECT_EQ(*codes,
+            (std::vector<std::string>{"en-US", "fr-FR", "de-DE", "it-IT", "pt-BR", "es-ES", "ru-RU",
+                                      "uk-UA", "zh-Hans", "zh-Hant", "ja-JP", "ko-KR"}));
+  struct Case {
+    const char* code;
+    const char* model;
+  } models[] = {{"en-US", "eng"},
+                {"uk-UA", "ukr"},
+                {"zh-Hant", "chi_tra"},
+                {"yue-Hans", "chi_sim"},
+                {"ja-JP", "jpn"},
+                {"ko-KR", "kor"},
+                {"en", ""},
+                {"EN-US", ""},
+                {"", ""}};
+  for (const auto& c : models) {
+    EXPECT_EQ(TesseractRecognizer::modelForLanguageCode(c.code), c.model) << c.code;
+  }
+
+  // A folder with English alone: only English is offered, French fails as not installed.
+  testing::TempDir dir;
+  std::filesystem::create_symlink(std::string(kDataPath) + "/eng.traineddata",
+                                  dir.file("eng.traineddata"));
+  auto english = TesseractRecognizer::init({dir.path(), 1, 0, 2200});
+  ASSERT_TRUE(english->isAvailable());
+  EXPECT_EQ(english->supportedRecognitionLanguages(1, 0, &error),
+            (std::optional<std::vector<std::string>>{{"en-US"}}));
+  PlatformRegistry::setTextRecognizer(english);
+  auto outcome = perform(fixture("french"), TextRecognitionLevelFast, {"fr-FR"});
+  ASSERT_TRUE(outcome.error);
+  EXPECT_EQ(outcome.error->code, TextRecognitionErrorUnsupportedLanguage);
+  EXPECT_NE(outcome.error->userInfoString("Error reason").find("not installed"), std::string::npos);
+  // Detection without the orientation model reads with the Latin languages it has.
+  outcome = perform(fixture("german"), TextRecognitionLevelFast, {}, true);
+  EXPECT_FALSE(outcome.error);
+  EXPECT_LT(testing::characterErrorRate(testing::fixtureText("german"), outcome.text()), 0.1);
+  PlatformRegistry::setTextRecognizer(nullptr);
+}
+
+TEST(TesseractLanguageData, WithoutAnyDataNothingIsAvailable) {
+  testing::TempDir empty;
+  // A model file that is not one: the engine cannot start on it.
+  ASSERT_TRUE(writeFileAtomically(empty.file("fra.traineddata"), Data{'n', 'o', 'p', 'e'}));
+  auto none = TesseractRecognizer::init({empty.path() + "/missing", 0, 64 << 20, 2200});
+  EXPECT_FALSE(none->isAvailable());
+  Error error;
+  EXPECT_FALSE(none->supportedRecognitionLanguages(0, 0, &error));
+  EXPECT_EQ(error.domain, TextRecognitionErrorDomain);
+  EXPECT_EQ(error.code, TextRecognitionErrorNoRecognizer);
+
+  auto broken = TesseractRecognizer::init({empty.path(), 0, 64 << 20, 2200});
+  ASSERT_TRUE(broken->isAvailable());
+  PlatformRegistry::setTextRecognizer(broken);
+  auto outcome = perform(fixture("french"), TextRecognitionLevelFast, {"fr-FR"});
+  ASSERT_TRUE(outcome.error);
+  EXPECT_EQ(outcome.error->code, TextRecognitionErrorEngineFailure);
+  PlatformRegistry::setTextRecognizer(nullptr);
+}
+
+TEST(TesseractEnginePool, IdleEnginesBeyondTheCapAreStopped) {
+  // A cap of one byte keeps only the engine used last.
+  auto recognizer = TesseractRecognizer::init({"", 0, 1, 2200});
+  PlatformRegistry::setTextRecognizer(recognizer);
+  auto line = Image::initByReferencingFile(testing::fixturePath("ocr/lines/line-002.png"));
+  for (const char* code : {"en-US", "fr-FR", "en-US"}) {
+    auto outcome =
+        perform(ImageRequestHandler::initWithImage(line, {}), TextRecognitionLevelFast, {code});
+    ASSERT_FALSE(outcome.error);
+    EXPECT_EQ(recognizer->statistics().idleEngines, 1u);
+  }
+  EXPECT_EQ(recognizer->statistics().enginesStarted, 3u);  // English was stopped
+  recognizer->releaseIdleEngines();
+  EXPECT_EQ(recognizer->statistics().idleEngines, 0u);
+  PlatformRegistry::setTextRecognizer(nullptr);
+}
+
+}  // namespace
+}  // namespace corvel

@@ -1,0 +1,109 @@
+#include "support/FakeRecognizer.h"
+
+#include <algorithm>
+
+namespace corvel::testing {
+
+void FakeRecognizer::setAvailable(bool available) {
+  std::lock_guard lock(mutex_);
+  available_ = available;
+}
+
+void FakeRecognizer::setObservations(std::vector<RecognizedTextObservation> observations) {
+  std::lock_guard lock(mutex_);
+  observations_ = std::move(observations);
+}
+
+void FakeRecognizer::setFailure(std::optional<Error> error) {
+  std::lock_guard lock(mutex_);
+  failure_ = std::move(error);
+}
+
+void FakeRecognizer::setSupportedLanguages(std::optional<std::vector<std::string>> codes,
+                                           Error error) {
+  std::lock_guard lock(mutex_);
+  supported_ = std::move(codes);
+  supportedError_ = std::move(error);
+}
+
+void FakeRecognizer::hold() {
+  std::lock_guard lock(mutex_);
+  held_ = true;
+}
+
+void FakeRecognizer::release() {
+  {
+    std::lock_guard lock(mutex_);
+    held_ = false;
+  }
+  changed_.notify_all();
+}
+
+bool FakeRecognizer::waitForRunning(std::size_t count, std::chrono::milliseconds timeout) {
+  std::unique_lock lock(mutex_);
+  return changed_.wait_for(lock, timeout, [&] { return running_ >= count; });
+}
+
+bool FakeRecognizer::waitForRecognitions(std::size_t count, std::chrono::milliseconds timeout) {
+  std::unique_lock lock(mutex_);
+  return changed_.wait_for(lock, timeout, [&] { return requests_.size() >= count; });
+}
+
+std::size_t FakeRecognizer::running() const {
+  std::lock_guard lock(mutex_);
+  return running_;
+}
+
+std::size_t FakeRecognizer::maxRunning() const {
+  std::lock_guard lock(mutex_);
+  return maxRunning_;
+}
+
+std::vector<FakeRecognizer::Recorded> FakeRecognizer::requests() const {
+  std::lock_guard lock(mutex_);
+  return requests_;
+}
+
+std::vector<FakeRecognizer::SupportedQuery> FakeRecognizer::supportedQueries() const {
+  std::lock_guard lock(mutex_);
+  return supportedQueries_;
+}
+
+bool FakeRecognizer::isAvailable() const {
+  std::lock_guard lock(mutex_);
+  return available_;
+}
+
+std::optional<std::vector<RecognizedTextObservation>> FakeRecognizer::recognize(
+    const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) {
+  std::unique_lock lock(mutex_);
+  Recorded recorded{request.revision(),
+                    request.usesLanguageCorrection(),
+                    request.recognitionLevel(),
+                    request.recognitionLanguages(),
+                    request.automaticallyDetectsLanguage(),
+                    bitmap.width(),
+                    bitmap.height()};
+  ++running_;
+  maxRunning_ = std::max(maxRunning_, running_);
+  changed_.notify_all();
+  changed_.wait(lock, [this] { return !held_; });
+  --running_;
+  requests_.push_back(std::move(recorded));
+  changed_.notify_all();
+  if (failure_) {
+    *error = *failure_;
+    return std::nullopt;
+  }
+  return observations_;
+}
+
+std::optional<std::vector<std::string>> FakeRecognizer::supportedRecognitionLanguages(
+    std::int64_t level, std::int64_t revision, Error* error) {
+  std::lock_guard lock(mutex_);
+  supportedQueries_.push_back({level, revision});
+  if (!supported_) *error = supportedError_;
+  return supported_;
+}
+
+}  // namespace corvel::testing

@@ -1,0 +1,258 @@
+// corvel ocr [--lang CODE]... [--fast] [--json] [--overlay OUT.png] FILE-OR-URL...
+//
+// Recognises each image and prints its reading-order text (a "==> FILE <==" header line
+// before each when there are several), or with --json one JSON object per line and file:
+// {"file", "text", "blocks"} where "blocks" is the analysed column tree in the blocks'
+// dictionary form. --overlay draws the page with its columns (blue), paragraphs (green)
+// and lines (red) into OUT.png (OUT-1.png, OUT-2.png, ... for several files). All files
+// go through the shared queue at once; a progress bar goes to standard error when it is
+// a terminal. A file that fails gets its error on standard error and the others still
+// complete; the exit status is then 1.
+#include <unistd.h>
+
+#include <algorithm>
+#include <iostream>
+#include <nlohmann/json.hpp>
+#include <string>
+#include <vector>
+
+#include "Commands.h"
+#include "Corvelbase/RVRecognitionBlock.h"
+#include "Corvelbase/RVTextLayoutAnalyser.h"
+#include "Corvelbase/RVVisionOCR.h"
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/Image.h"
+
+namespace corvel::tool {
+
+namespace {
+
+using nlohmann::json;
+
+struct Options {
+  std::vector<std::string> languages;
+  bool fast = false;
+  bool json = false;
+  std::string overlay;
+  std::vector<std::string> inputs;
+};
+
+struct Outcome {
+  bool delivered = false;
+  String text;
+  std::optional<Error> error;
+  std::shared_ptr<RVVisionOCR> job;
+};
+
+bool isURL(const std::string& input) {
+  return input.find("://") != std::string::npos || input.rfind("file:", 0) == 0;
+}
+
+std::shared_ptr<Image> imageFor(const std::string& input) {
+  return isURL(input) ? Image::initByReferencingURL(input) : Image::initByReferencingFile(input);
+}
+
+json jsonFromPropertyList(const PropertyList& value) {
+  return std::visit(
+      [](const auto& v) -> json {
+        using T = std::decay_t<decltype(v)>;
+        if constexpr (std::is_same_v<T, String>) {
+          return toUTF8(v);
+        } else if constexpr (std::is_same_v<T, PropertyList::Array>) {
+          json array = json::array();
+          for (const auto& element : v) array.push_back(jsonFromPropertyList(element));
+          return array;
+        } else if constexpr (std::is_same_v<T, PropertyList::Dictionary>) {
+          json object = json::object();
+          for (const auto& [key, element] : v) object[key] = jsonFromPropertyList(element);
+          return object;
+        } else if constexpr (std::is_same_v<T, bool> || std::is_same_v<T, std::int64_t> ||
+                             std::is_same_v<T, std::uint64_t> || std::is_same_v<T, double>) {
+          return v;
+        } else {
+          return nullptr;  // kinds the block form never holds
+        }
+      },
+      value.value());
+}
+
+std::string describe(const Error& error) {
+  std::string reason = error.userInfoString("Error reason");
+  return (reason.empty() ? error.description() : reason) + " (" + error.domain + " " +
+         std::to_string(error.code) + ")";
+}
+
+// --- the overlay ----------------------------------------------------------------------
+
+struct Colour {
+  std::uint8_t r, g, b;
+};
+
+void strokeRect(Data& rgba, std::uint32_t width, std::uint32_t height, const Rect& box,
+                Colour colour, int thickness) {
+  auto clampX = [&](double v) {
+    return static_cast<long>(std::clamp(v, 0.0, static_cast<double>(width) - 1));
+  };
+  auto clampY = [&](double v) {
+    return static_cast<long>(std::clamp(v, 0.0, static_cast<double>(height) - 1));
+  };
+  if (!(box.size.width >= 0 && box.size.height >= 0)) return;  // also rejects NaN
+  // Boxes are normalised with the origin at the bottom left; pixels count from the top.
+  long left = clampX(box.origin.x * width), right = clampX((box.origin.x + box.size.width) * width);
+  long top = clampY((1 - box.origin.y - box.size.height) * height);
+  long bottom = clampY((1 - box.origin.y) * height);
+  auto plot = [&](long x, long y) {
+    if (x < 0 || y < 0 || x >= static_cast<long>(width) || y >= static_cast<long>(height)) return;
+    std::uint8_t* p =
+        &rgba[(static_cast<std::size_t>(y) * width + static_cast<std::size_t>(x)) * 4];
+    p[0] = colour.r, p[1] = colour.g, p[2] = colour.b, p[3] = 255;
+  };
+  for (int t = 0; t < thickness; ++t) {
+    for (long x = left - t; x <= right + t; ++x) plot(x, top - t), plot(x, bottom + t);
+    for (long y = top - t; y <= bottom + t; ++y) plot(left - t, y), plot(right + t, y);
+  }
+}
+
+void strokeTree(Data& rgba, std::uint32_t width, std::uint32_t height,
+                const RVRecognitionBlock& block, int thickness) {
+  static const Colour kColours[] = {{30, 90, 230}, {20, 160, 60}, {220, 40, 40}};
+  for (const auto& child : block.children()) strokeTree(rgba, width, height, *child, thickness);
+  auto level = std::min<std::uint64_t>(block.level(), 2);
+  // Outer levels are drawn a little outside the inner ones so all three stay visible.
+  int grow = static_cast<int>(2 - level) * thickness * 2;
+  Rect box = block.boundingBox();
+  double dx = static_cast<double>(grow) / width, dy = static_cast<double>(grow) / height;
+  Rect grown(box.origin.x - dx, box.origin.y - dy, box.size.width + 2 * dx,
+             box.size.height + 2 * dy);
+  strokeRect(rgba, width, height, grown, kColours[level], thickness);
+}
+
+// Draws the analysed tree over the page; an error message, or "" on success.
+std::string writeOverlay(const std::string& input, const RVBlockArray& columns,
+                         const std::string& out) {
+  auto page = imageFor(input)->bitmap();
+  if (!page) return "cannot read the image again for the overlay";
+  std::uint32_t width = page->width(), height = page->height();
+  Data rgba = page->rgba();
+  int thickness = static_cast<int>(std::max<std::uint32_t>(1, std::max(width, height) / 800));
+  for (const auto& column : columns) strokeTree(rgba, width, height, *column, thickness);
+  auto drawn = Bitmap::fromRGBA(width, height, rgba.data(), rgba.size());
+  auto png = drawn ? pngDataForBitmap(*drawn) : std::nullopt;
+  if (!png) return "cannot encode the overlay";
+  if (!writeFileAtomically(out, *png)) return "cannot write " + out;
+  return "";
+}
+
+std::string overlayName(const std::string& base, std::size_t index, std::size_t count) {
+  if (count == 1) return base;
+  std::size_t dot = base.rfind('.');
+  std::size_t slash = base.rfind('/');
+  if (dot == std::string::npos || (slash != std::string::npos && dot < slash)) dot = base.size();
+  return base.substr(0, dot) + "-" + std::to_string(index + 1) + base.substr(dot);
+}
+
+// --- progress and output --------------------------------------------------------------
+
+void showProgress(std::size_t done, std::size_t total) {
+  constexpr int kWidth = 30;
+  int filled = static_cast<int>(kWidth * done / std::max<std::size_t>(total, 1));
+  std::cerr << "\r[" << std::string(static_cast<std::size_t>(filled), '#')
+            << std::string(static_cast<std::size_t>(kWidth - filled), ' ') << "] " << done << "/"
+            << total << (done == total ? "\r\033[K" : "") << std::flush;
+}
+
+bool report(const Options& options, std::size_t index, const Outcome& outcome) {
+  const std::string& input = options.inputs[index];
+  if (outcome.error) {
+    std::cerr << "corvel: " << input << ": " << describe(*outcome.error) << '\n';
+    return false;
+  }
+  auto columns = outcome.job->layoutAnalyser()->layoutBlocks();
+  if (options.json) {
+    json blocks = json::array();
+    if (columns)
+      for (const auto& column : *columns)
+        blocks.push_back(jsonFromPropertyList(column->blockInformation()));
+    std::cout << json{{"file", input}, {"text", toUTF8(outcome.text)}, {"blocks", blocks}}.dump()
+              << '\n';
+  } else {
+    if (options.inputs.size() > 1) std::cout << (index ? "\n" : "") << "==> " << input << " <==\n";
+    std::cout << toUTF8(outcome.text) << '\n';
+  }
+  std::cout.flush();
+  if (!options.overlay.empty() && columns) {
+    std::string failure =
+        writeOverlay(input, *columns, overlayName(options.overlay, index, options.inputs.size()));
+    if (!failure.empty()) {
+      std::cerr << "corvel: " << input << ": " << failure << '\n';
+      return false;
+    }
+  }
+  return true;
+}
+
+int run(const Arguments& args) {
+  Options options;
+  for (std::size_t i = 0; i < args.size(); ++i) {
+    const std::string& arg = args[i];
+    if (arg == "--lang" || arg == "--overlay") {
+      if (i + 1 >= args.size()) return misuse(arg + " needs a value");
+      if (arg == "--lang") {
+        options.languages.push_back(args[++i]);
+      } else {
+        options.overlay = args[++i];
+      }
+    } else if (arg == "--fast") {
+      options.fast = true;
+    } else if (arg == "--json") {
+      options.json = true;
+    } else if (arg.size() > 1 && arg[0] == '-') {
+      return misuse("unknown option " + arg);
+    } else {
+      options.inputs.push_back(arg);
+    }
+  }
+  if (options.inputs.empty()) return misuse("ocr needs at least one image file or file: URL");
+
+  std::vector<Outcome> outcomes(options.inputs.size());
+  for (std::size_t i = 0; i < options.inputs.size(); ++i) {
+    Outcome* outcome = &outcomes[i];
+    outcome->job =
+        RVVisionOCR::ocrImage(imageFor(options.inputs[i]), options.languages, options.fast,
+                              [outcome](const String& text, const std::optional<Error>& error) {
+                                outcome->delivered = true;
+                                outcome->text = text;
+                                outcome->error = error;
+                              });
+  }
+  // Results are printed in the order of the inputs, each as soon as it and all before it
+  // are in; the completions arrive on this thread, through the main queue.
+  bool progress = isatty(STDERR_FILENO) && options.inputs.size() > 1;
+  std::size_t printed = 0, delivered = 0;
+  bool allGood = true;
+  auto advance = [&] {
+    std::size_t now = static_cast<std::size_t>(std::count_if(
+        outcomes.begin(), outcomes.end(), [](const Outcome& o) { return o.delivered; }));
+    if (progress && now != delivered) showProgress(now, outcomes.size());
+    delivered = now;
+    while (printed < outcomes.size() && outcomes[printed].delivered) {
+      if (progress) std::cerr << "\r\033[K";
+      allGood = report(options, printed, outcomes[printed]) && allGood;
+      ++printed;
+      if (progress && printed < outcomes.size()) showProgress(delivered, outcomes.size());
+    }
+    return printed == outcomes.size();
+  };
+  if (progress) showProgress(0, outcomes.size());
+  MainQueue::runUntil(advance);
+  return allGood ? 0 : 1;
+}
+
+CommandRegistration reg("ocr",
+                        "ocr [--lang CODE]... [--fast] [--json] [--overlay OUT.png] FILE-OR-URL... "
+                        ": recognise the text of images in reading order",
+                        &run);
+
+}  // namespace
+
+}  // namespace corvel::tool
