@@ -1,4 +1,4 @@
-// The whole life of a drawing with real files, the RTFD writer and reader and the
+// The whole life of drawings with real files, the RTFD writer and reader and the
 // pasteboard, the test playing the host application around each call.
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
@@ -30,43 +30,19 @@ class DrawingLife : public ::testing::Test {
   std::string insert(AttributedString& text, std::uint64_t at, Size size, const Data& strokes) {
     text.insertImage(testing::makePicture(size.width, size.height), strokes, Range{at, 0});
     auto picture = std::dynamic_pointer_cast<RVMXScaledImageAttachment>(text.attachmentAtIndex(at));
-    return picture ? picture->pencilAttachment()->uuid().value_or("") : "";
+    if (!picture) return "";
+    own.insert(own.end(), {picture, picture->pencilAttachment()});
+    std::string uuid = picture->pencilAttachment()->uuid().value_or("");
+    made[uuid] = picture->pencilAttachment();
+    return uuid;
   }
 
-  // The host's copy or cut: the library's calls around the text system's write.
-  void copyOrCut(AttributedString& text, Range selection, bool cut) {
-    text.preCutOrCopy(selection);
-    PasteboardItem item;
-    item.setData(RTFDFromRange(text, selection), kFlatRTFD);
-    pasteboard->writeItems({item});
-    if (cut) text.deleteCharactersInRange(selection);
-    text.postCutOrCopy(selection);
-  }
-
-  // The host's paste: the pasteboard's text, then the drawings' item.
-  void paste(AttributedString& text, std::uint64_t at) {
-    auto pasted = attributedStringWithRTFD(pasteboard->dataForType(kFlatRTFD).value_or(Data{}));
-    ASSERT_TRUE(pasted);
-    text.insertAttributedString(*pasted, at);
-    text.checkForPencilDataOnPaste();
-  }
-
-  // The host's save: every picture and drawing writes its own file; the drawings are
-  // appended for the write and taken out after it. `kept` are drawings from a load.
-  void save(AttributedString& text, const std::string& path, PencilAttachmentDictionary kept = {}) {
-    std::vector<std::shared_ptr<RVMXTextAttachment>> own;
-    for (std::uint64_t i = 0; i < text.length(); ++i)
-      if (auto picture =
-              std::dynamic_pointer_cast<RVMXScaledImageAttachment>(text.attachmentAtIndex(i))) {
-        own.push_back(picture);
-        if (auto drawing = picture->pencilAttachment()) {
-          own.push_back(drawing);
-          kept[drawing->uuid().value_or("")] = drawing;
-        }
-      }
+  // The host's save: the pictures and drawings it made write their own files; the
+  // drawings are appended for the write and taken out after it.
+  void save(AttributedString& text, const std::string& path, PencilAttachmentDictionary drawings) {
     for (const auto& a : own) a->setSaving(kSavingWritingOut);
     Range whole{0, text.length()};
-    text.preSaveRTFD(&whole, kept);
+    text.preSaveRTFD(&whole, drawings);
     EXPECT_TRUE(writeRTFDToPath(text, path));
     text.postSaveRTFD(whole);
     for (const auto& a : own) a->setSaving(kSavingEditing);
@@ -82,27 +58,31 @@ class DrawingLife : public ::testing::Test {
     return {text, drawings};
   }
 
+  std::vector<std::shared_ptr<RVMXTextAttachment>> own;  // what insert made
+  PencilAttachmentDictionary made;                       // its drawings by identifier
   testing::ScopedCachesDirectory caches;
   testing::ScopedPasteboard pasteboard;
   testing::LogCapture log;
   testing::TempDir documents;
 };
 
-TEST_F(DrawingLife, ADrawingComesThroughCopyPasteSaveAndLoadUnchanged) {
-  Data strokes = testing::makeStrokes(4096, 5);
-  AttributedString text(u"Before  after");
-  std::string uuid = insert(text, 7, Size{240, 160}, strokes);
-  EXPECT_EQ(caches.names(), (std::set<std::string>{uuid + ".jpeg", uuid + ".pencildata"}));
+TEST_F(DrawingLife, DrawingsComeThroughCopyPasteSaveAndLoadUnchanged) {
+  Data strokesA = testing::makeStrokes(4096, 5), strokesB = testing::makeStrokes(20000, 8);
+  AttributedString text(u"Before  after ");
+  std::string a = insert(text, 7, Size{240, 160}, strokesA);
+  std::string b = insert(text, 15, Size{70, 20}, strokesB);
 
-  // Copy "e <picture> a": the flat RTFD carries <uuid>.jpeg, the drawings' item sits
-  // beside it, and the picture is back to editing.
-  copyOrCut(text, Range{5, 5}, false);
+  // Copy "e <A> a" as the text system does: the drawings' item sits beside the flat RTFD
+  // holding A alone, and the picture is back to editing.
+  text.preCutOrCopy(Range{5, 5});
+  PasteboardItem written;
+  written.setData(RTFDFromRange(text, Range{5, 5}), kFlatRTFD);
+  pasteboard->writeItems({written});
+  text.postCutOrCopy(Range{5, 5});
   EXPECT_EQ(text.attachmentAtIndex(7)->fileWrapper(), nullptr);
   auto items = pasteboard->items();
   ASSERT_EQ(items.size(), 1u);
   EXPECT_EQ(items[0].types(), (std::vector<std::string>{kFlatRTFD, RVPencilPasteboardData}));
-  auto flat = FileWrapper::initWithSerializedRepresentation(*items[0].dataForType(kFlatRTFD));
-  ASSERT_TRUE(flat && flat->fileWrappers().count(uuid + ".jpeg"));
 
   // The item reads as the platform's keyed archive to a parser no one here wrote.
   std::string item = documents.file("pencil.archive");
@@ -114,68 +94,45 @@ TEST_F(DrawingLife, ADrawingComesThroughCopyPasteSaveAndLoadUnchanged) {
   auto json = nlohmann::json::parse(reader.output);
   EXPECT_EQ(json["archiver"], "NSKeyedArchiver");
   EXPECT_EQ(json["rootIsUid"], true);
-  EXPECT_EQ(json["entries"], (nlohmann::json{{uuid, hex(strokes)}}));
+  EXPECT_EQ(json["entries"], (nlohmann::json{{a, hex(strokesA)}}));
 
-  // Paste into another text: a plain picture named <uuid>.jpeg, the strokes by <uuid>.
+  // Paste into another text: the flat RTFD carried a plain picture named <a>.jpeg, the
+  // drawings' item the strokes by <a>.
   AttributedString other(u"Pasted: ");
-  paste(other, 8);
+  auto pasted = attributedStringWithRTFD(*items[0].dataForType(kFlatRTFD));
+  ASSERT_TRUE(pasted);
+  other.insertAttributedString(*pasted, 8);
+  other.checkForPencilDataOnPaste();
   ASSERT_EQ(other.string(), u"Pasted: e \uFFFC a");
-  EXPECT_EQ(other.fileIDForAttachment(other.attachmentAtIndex(10)), uuid);
-  EXPECT_EQ(pastedPencilDataDictionary, (PencilDataDictionary{{uuid, strokes}}));
+  EXPECT_EQ(other.fileIDForAttachment(other.attachmentAtIndex(10)), a);
+  EXPECT_EQ(pastedPencilDataDictionary, (PencilDataDictionary{{a, strokesA}}));
   EXPECT_EQ(testing::decodedSize(bytesOf(other.attachmentAtIndex(10))), (Size{240, 160}));
 
-  // Save: picture and drawing in the bundle under one identifier; the appended
-  // drawing's character stays behind as a plain character.
+  // Save: each picture and drawing in the bundle under its own identifier; the appended
+  // drawings' characters stay behind as plain characters.
   std::uint64_t length = text.length();
-  save(text, documents.file("Note.rtfd"));
-  EXPECT_EQ(testing::ScopedCachesDirectory::namesIn(documents.file("Note.rtfd")),
-            (std::set<std::string>{"TXT.rtf", uuid + ".jpeg", uuid + ".pencildata"}));
-  EXPECT_EQ(text.length(), length + 1);
-  EXPECT_FALSE(text.attachmentAtIndex(length));
-
-  // Load: the drawing by its identifier with the bytes inserted, the picture at its size.
-  auto [loaded, drawings] = load(documents.file("Note.rtfd"));
-  ASSERT_EQ(drawings.size(), 1u);
-  EXPECT_EQ(bytesOf(drawings[uuid]), strokes);
-  EXPECT_EQ(loaded.fileIDForAttachment(loaded.attachmentAtIndex(7)), uuid);
-  EXPECT_EQ(testing::decodedSize(bytesOf(loaded.attachmentAtIndex(7))), (Size{240, 160}));
-
-  // The kept drawing goes back in at the next save and comes out again unchanged.
-  save(loaded, documents.file("Again.rtfd"), drawings);
-  EXPECT_EQ(bytesOf(load(documents.file("Again.rtfd")).second[uuid]), strokes);
-  EXPECT_TRUE(log.lines().empty());
-}
-
-TEST_F(DrawingLife, ACutDrawingPastesElsewhere) {
-  Data strokes = testing::makeStrokes(777, 6);
-  AttributedString text(u"ab");
-  std::string uuid = insert(text, 1, Size{33, 21}, strokes);
-  copyOrCut(text, Range{1, 2}, true);
-  EXPECT_EQ(text.string(), u"a");
-  AttributedString target;
-  paste(target, 0);
-  ASSERT_EQ(target.string(), u"\uFFFCb");
-  EXPECT_EQ(target.fileIDForAttachment(target.attachmentAtIndex(0)), uuid);
-  EXPECT_EQ(pastedPencilDataDictionary, (PencilDataDictionary{{uuid, strokes}}));
-  EXPECT_EQ(testing::decodedSize(bytesOf(target.attachmentAtIndex(0))), (Size{33, 21}));
-}
-
-TEST_F(DrawingLife, TwoDrawingsSaveAndLoadEachWithItsOwnStrokes) {
-  Data strokesA = testing::makeStrokes(1000, 7), strokesB = testing::makeStrokes(20000, 8);
-  AttributedString text(u"one  two ");
-  std::string a = insert(text, 4, Size{50, 40}, strokesA);
-  std::string b = insert(text, 10, Size{70, 20}, strokesB);
-  save(text, documents.file("Two.rtfd"));
-  EXPECT_EQ(testing::ScopedCachesDirectory::namesIn(documents.file("Two.rtfd")),
+  save(text, documents.file("Note.rtfd"), made);
+  EXPECT_EQ(testing::namesIn(documents.file("Note.rtfd")),
             (std::set<std::string>{"TXT.rtf", a + ".jpeg", a + ".pencildata", b + ".jpeg",
                                    b + ".pencildata"}));
-  auto [loaded, drawings] = load(documents.file("Two.rtfd"));
+  EXPECT_EQ(text.length(), length + 2);
+  EXPECT_FALSE(text.attachmentAtIndex(length));
+
+  // Load: each drawing by its identifier with its own bytes, the pictures in place.
+  auto [loaded, drawings] = load(documents.file("Note.rtfd"));
   ASSERT_EQ(drawings.size(), 2u);
   EXPECT_EQ(bytesOf(drawings[a]), strokesA);
   EXPECT_EQ(bytesOf(drawings[b]), strokesB);
-  EXPECT_EQ(loaded.fileIDForAttachment(loaded.attachmentAtIndex(4)), a);
-  EXPECT_EQ(loaded.fileIDForAttachment(loaded.attachmentAtIndex(10)), b);
-  EXPECT_EQ(testing::decodedSize(bytesOf(loaded.attachmentAtIndex(10))), (Size{70, 20}));
+  EXPECT_EQ(loaded.fileIDForAttachment(loaded.attachmentAtIndex(7)), a);
+  EXPECT_EQ(loaded.fileIDForAttachment(loaded.attachmentAtIndex(15)), b);
+  EXPECT_EQ(testing::decodedSize(bytesOf(loaded.attachmentAtIndex(15))), (Size{70, 20}));
+
+  // The kept drawings go back in at the next save and come out again unchanged.
+  save(loaded, documents.file("Again.rtfd"), drawings);
+  auto again = load(documents.file("Again.rtfd")).second;
+  EXPECT_EQ(bytesOf(again[a]), strokesA);
+  EXPECT_EQ(bytesOf(again[b]), strokesB);
+  EXPECT_TRUE(log.lines().empty());
 }
 
 }  // namespace

@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <regex>
+
 #include "Corvelbase/RVPencilAttachment.h"
 #include "Corvelbase/platform/Files.h"
 #include "tests/attachments/PencilTestSupport.h"
@@ -14,11 +16,9 @@ TEST(PencilAttachment, EachDrawingWritesItsBytesUnderAFreshUpperCaseUUID) {
   auto twin = RVPencilAttachment::initWithData(strokes, "public.data");
   ASSERT_TRUE(drawing->uuid() && twin->uuid());
   EXPECT_NE(*drawing->uuid(), *twin->uuid());
-  EXPECT_EQ(drawing->uuid()->size(), 36u);
-  EXPECT_EQ(drawing->uuid()->find_first_not_of("0123456789ABCDEF-"), std::string::npos);
-  std::string name = *drawing->uuid() + ".pencildata";
-  EXPECT_EQ(readFile(caches.file(name)), strokes);  // no header, no framing
-  EXPECT_EQ(drawing->fw()->filename(), name);
+  EXPECT_TRUE(
+      std::regex_match(*drawing->uuid(), std::regex("[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}")));
+  EXPECT_EQ(readFile(caches.file(*drawing->uuid() + ".pencildata")), strokes);  // as given
   // Without data there is nothing to name or write.
   auto empty = RVPencilAttachment::initWithData(std::nullopt, "public.data");
   EXPECT_FALSE(empty->uuid() || empty->fw() || empty->strokeData());
@@ -30,10 +30,8 @@ TEST(PencilAttachment, WhatItHandsOutFollowsSaving) {
   Data strokes = testing::makeStrokes(64, 2);
   auto drawing = RVPencilAttachment::initWithData(strokes, "com.example.ink");
   ASSERT_TRUE(drawing->fw());
-  struct Case {
-    std::int64_t saving;
-    bool writingOut;
-  } cases[] = {{0, false}, {1, true}, {2, false}, {7, false}, {-1, false}};
+  const std::pair<std::int64_t, bool> cases[] = {
+      {0, false}, {1, true}, {2, false}, {7, false}, {-1, false}};  // saving, writing out
   for (const auto& [saving, writingOut] : cases) {
     drawing->setSaving(saving);
     // The file only while written out, the contents only while not: never both.

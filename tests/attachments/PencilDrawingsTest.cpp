@@ -1,25 +1,27 @@
 #include <gtest/gtest.h>
 
 #include "Corvelbase/PencilDrawings.h"
+#include "Corvelbase/platform/Files.h"
+#include "Corvelbase/platform/KeyedArchive.h"
+#include "Corvelbase/platform/RTFD.h"
 #include "tests/attachments/PencilTestSupport.h"
 
 namespace corvel {
 namespace {
-
-using testing::namedAttachment;
 
 std::shared_ptr<RVMXScaledImageAttachment> pictureAt(const AttributedString& text,
                                                      std::uint64_t index) {
   return std::dynamic_pointer_cast<RVMXScaledImageAttachment>(text.attachmentAtIndex(index));
 }
 
-AttributedString textOf(std::initializer_list<std::shared_ptr<TextAttachment>> attachments) {
-  AttributedString text(u"<");
-  for (const auto& a : attachments) {
-    text.appendAttributedString(AttributedString::attributedStringWithAttachment(a));
-    text.appendAttributedString(AttributedString(u" "));
-  }
-  return text;
+using Attachment = std::shared_ptr<TextAttachment>;
+
+// A plain attachment whose wrapper has the given names, as a loaded text holds them.
+Attachment named(std::optional<std::string> preferred, std::optional<std::string> filename) {
+  auto wrapper = FileWrapper::initRegularFileWithContents({});
+  wrapper->setPreferredFilename(std::move(preferred));
+  wrapper->setFilename(std::move(filename));
+  return TextAttachment::initWithFileWrapper(wrapper);
 }
 
 TEST(PencilDrawings, CutAndCopyWriteOnlyWhatTheyHoldAndResetOnlyInsideTheText) {
@@ -62,16 +64,16 @@ TEST(PencilDrawings, CutAndCopyWriteOnlyWhatTheyHoldAndResetOnlyInsideTheText) {
 
 TEST(PencilDrawings, TheTwoIdentifiersDifferOnPreferredFilename) {
   struct Case {
-    std::shared_ptr<TextAttachment> attachment;
+    Attachment attachment;
     std::optional<std::string> identifier, fileID;
   } cases[] = {
-      {namedAttachment("P.jpeg", "F.jpeg"), "P", "F"},
-      {namedAttachment(std::nullopt, "F.jpeg"), "F", "F"},
-      {namedAttachment("P.jpeg", std::nullopt), "P", std::nullopt},
-      {namedAttachment(std::nullopt, std::nullopt), std::nullopt, std::nullopt},
-      {namedAttachment("a/b/Q.tar.gz", "/x/R.pencildata/"), "Q.tar", "R"},
-      {namedAttachment(".hidden", "noext"), ".hidden", "noext"},
-      {TextAttachment::init(), std::nullopt, std::nullopt},
+      {named("P.jpeg", "F.jpeg"), "P", "F"},
+      {named(std::nullopt, "F.jpeg"), "F", "F"},
+      {named("P.jpeg", std::nullopt), "P", std::nullopt},
+      {named(std::nullopt, std::nullopt), std::nullopt, std::nullopt},
+      {named("a/b/Q.tar.gz", "/x/R.pencildata/"), "Q.tar", "R"},
+      {named(".hidden", "noext"), ".hidden", "noext"},
+      {TextAttachment::init(), std::nullopt, std::nullopt},  // no wrapper
       {nullptr, std::nullopt, std::nullopt},
   };
   AttributedString text;
@@ -82,16 +84,18 @@ TEST(PencilDrawings, TheTwoIdentifiersDifferOnPreferredFilename) {
 }
 
 TEST(PencilDrawings, SavingAppendsInTextOrderAndRemovingLeavesTheCharacters) {
-  auto one = namedAttachment(std::nullopt, "ONE.jpeg"), two = namedAttachment("TWO.jpeg", "x");
-  auto drawingOne = namedAttachment(std::nullopt, "ONE.pencildata");
-  auto drawingTwo = namedAttachment("TWO.pencildata", "other.bin");  // preferred name first
-  auto viaFilename = namedAttachment("t.jpeg", "T.pencildata");      // failing that, filename
-  auto upper = namedAttachment(std::nullopt, "u.PENCILDATA");        // case matters
-  auto text = textOf({two, one, viaFilename, upper, TextAttachment::init(), two, nullptr});
+  auto one = named(std::nullopt, "ONE.jpeg"), two = named("TWO.jpeg", "x");
+  auto drawingOne = named(std::nullopt, "ONE.pencildata");
+  auto drawingTwo = named("TWO.pencildata", "other.bin");  // preferred name first
+  auto viaFilename = named("t.jpeg", "T.pencildata");      // failing that, filename
+  auto upper = named(std::nullopt, "u.PENCILDATA");        // case matters
+  AttributedString text(u"<");
+  for (const auto& a : {two, one, viaFilename, upper, TextAttachment::init(), two, Attachment()})
+    text.appendAttributedString(AttributedString::attributedStringWithAttachment(a));
   const AttributedString original = text;
 
-  // No dictionary, an empty one, keys matching nothing, the form without a dictionary:
-  // nothing changes, and the range is never touched.
+  // No dictionary, an empty one, keys matching nothing or a null drawing, the form
+  // without a dictionary: nothing changes, and the range is never touched.
   Range range{123, 456};
   text.preSaveRTFD(&range);
   text.preSaveRTFD(nullptr, PencilAttachmentDictionary{});
@@ -107,18 +111,70 @@ TEST(PencilDrawings, SavingAppendsInTextOrderAndRemovingLeavesTheCharacters) {
   EXPECT_EQ(text.attachmentAtIndex(end + 1), drawingOne);
   EXPECT_EQ(text.attachmentAtIndex(end + 2), drawingTwo);  // its picture stands twice
 
-  auto taken = text.removePencilAttachments();
-  EXPECT_EQ(taken, (PencilAttachmentDictionary{
-                       {"ONE", drawingOne}, {"TWO", drawingTwo}, {"t", viaFilename}}));
+  EXPECT_EQ(
+      text.removePencilAttachments(),
+      (PencilAttachmentDictionary{{"ONE", drawingOne}, {"TWO", drawingTwo}, {"t", viaFilename}}));
   EXPECT_EQ(text.length(), end + 3);  // the characters stay, without their attachments
-  EXPECT_EQ(text.string()[5], AttachmentCharacter);
-  EXPECT_FALSE(text.attachmentAtIndex(5));
-  EXPECT_FALSE(text.attachmentAtIndex(end));
-  EXPECT_EQ(text.attachmentAtIndex(7), upper);
-  text.postSaveRTFD(range);  // nothing is left to take
-  EXPECT_EQ(text.attachmentAtIndex(7), upper);
-  text.postLoadDocument();
-  EXPECT_EQ(text.length(), end + 3);
+  EXPECT_EQ(text.string()[3], AttachmentCharacter);
+  for (std::uint64_t i : {std::uint64_t{3}, end, end + 2})
+    EXPECT_FALSE(text.attachmentAtIndex(i)) << i;
+  EXPECT_EQ(text.attachmentAtIndex(4), upper);
+}
+
+// ---- Pasteboard items and bundles that no well-behaved program writes ----
+
+// The archive reader's own tests go through every malformed archive; here, that an item
+// it refuses reaches the host as "no drawings", silently, and none leaves the last alone.
+TEST(PencilDrawingsHostile, PasteboardItemsThatAreNoDrawingsAreDroppedSilently) {
+  testing::ScopedPasteboard pasteboard;
+  testing::LogCapture log;
+  Data truncated = *KeyedArchive::archiveDictionary({{"K", {1, 2}}});
+  truncated.resize(truncated.size() - 5);
+  Data huge(100u << 20, 0xFF);  // 100 MB that claims to be a binary property list
+  std::copy_n("bplist00", 8, huge.begin());
+  AttributedString text;
+  for (const Data* item : {&truncated, &huge}) {
+    pastedPencilDataDictionary = PencilDataDictionary{{"before", {0}}};
+    ASSERT_TRUE(pasteboard->setData(*item, RVPencilPasteboardData));
+    text.checkForPencilDataOnPaste();
+    EXPECT_FALSE(pastedPencilDataDictionary) << item->size();
+  }
+  pasteboard->clearContents();
+  pastedPencilDataDictionary = PencilDataDictionary{};
+  text.checkForPencilDataOnPaste();
+  EXPECT_EQ(pastedPencilDataDictionary, PencilDataDictionary{});
+  EXPECT_TRUE(log.lines().empty());
+}
+
+// One bundle with every odd case: a drawing named but missing (as any name leading out
+// of the bundle or through a link ends: the bundle reader gives it no wrapper), a folder
+// named as a drawing (taken by its name, though it holds no strokes), and a drawing named
+// twice. Nothing but the drawings loses its attachment, and no character goes.
+TEST(PencilDrawingsHostile, BundlesGiveOnlyTheDrawingsTheyReallyHold) {
+  testing::TempDir dir;
+  std::string bundle = dir.file("doc.rtfd");
+  std::filesystem::create_directories(bundle + "/D.pencildata/inner");
+  ASSERT_TRUE(writeFileAtomically(bundle + "/A.jpeg", Data{6}));
+  ASSERT_TRUE(writeFileAtomically(bundle + "/A.pencildata", Data{7}));
+  ASSERT_TRUE(writeFileAtomically(bundle + "/S.pencildata", Data{8}));
+  std::string rtf = "{\\rtf1\\ansi\\ansicpg1252 text";
+  for (const char* name :
+       {"A.jpeg", "A.pencildata", "M.pencildata", "D.pencildata", "S.pencildata", "S.pencildata"})
+    rtf += std::string("{{\\NeXTGraphic ") + name + " \\width20 \\height20\n}\\'ac}";
+  ASSERT_TRUE(writeFileAtomically(bundle + "/TXT.rtf", Data(rtf.begin(), rtf.end())));
+  auto text = attributedStringWithContentsOfRTFD(bundle);
+  ASSERT_TRUE(text);
+  std::uint64_t length = text->length();
+  PencilDataDictionary found;
+  for (const auto& [identifier, attachment] : text->removePencilAttachments())
+    found[identifier] = attachment->fileWrapper()->regularFileContents().value_or(Data{});
+  EXPECT_EQ(found, (PencilDataDictionary{{"A", {7}}, {"D", {}}, {"S", {8}}}));
+  EXPECT_EQ(text->length(), length);
+  std::vector<std::optional<std::string>> left;
+  for (std::uint64_t i = 0; i < length; ++i)
+    if (auto attachment = text->attachmentAtIndex(i))
+      left.push_back(text->fileIDForAttachment(attachment));
+  EXPECT_EQ(left, (std::vector<std::optional<std::string>>{"A", std::nullopt}));
 }
 
 }  // namespace

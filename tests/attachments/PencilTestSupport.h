@@ -7,35 +7,31 @@
 #include <set>
 #include <string>
 
-#include "Corvelbase/platform/FileWrapper.h"
 #include "Corvelbase/platform/Image.h"
 #include "Corvelbase/platform/Pasteboard.h"
 #include "Corvelbase/platform/Platform.h"
-#include "Corvelbase/platform/TextAttachment.h"
 #include "support/TestSupport.h"
 
 namespace corvel::testing {
 
+// The names of the entries of `directory`.
+inline std::set<std::string> namesIn(const std::string& directory) {
+  std::set<std::string> result;
+  for (const auto& entry : std::filesystem::directory_iterator(directory))
+    result.insert(entry.path().filename().string());
+  return result;
+}
+
 // Points the caches directory at a fresh temporary folder while it lives, so no test
 // writes into the user's real caches; restores the previous setting after.
-class ScopedCachesDirectory {
+class ScopedCachesDirectory : public TempDir {
  public:
-  ScopedCachesDirectory() : previous_(PlatformRegistry::cachesDirectoryOverride()) {
-    PlatformRegistry::setCachesDirectory(dir_.path());
-  }
+  ScopedCachesDirectory() { PlatformRegistry::setCachesDirectory(path()); }
   ~ScopedCachesDirectory() { PlatformRegistry::setCachesDirectory(previous_); }
-  std::string file(const std::string& name) const { return dir_.file(name); }
-  std::set<std::string> names() const { return namesIn(dir_.path()); }
-  static std::set<std::string> namesIn(const std::string& directory) {
-    std::set<std::string> result;
-    for (const auto& entry : std::filesystem::directory_iterator(directory))
-      result.insert(entry.path().filename().string());
-    return result;
-  }
+  std::set<std::string> names() const { return namesIn(path()); }
 
  private:
-  TempDir dir_;
-  std::optional<std::string> previous_;
+  std::optional<std::string> previous_ = PlatformRegistry::cachesDirectoryOverride();
 };
 
 // A fresh process-local general pasteboard while it lives.
@@ -64,16 +60,6 @@ inline Data makeStrokes(std::size_t size, std::uint32_t seed) {
   Data bytes(size);
   for (auto& b : bytes) b = static_cast<std::uint8_t>((seed = seed * 1103515245u + 12345u) >> 16);
   return bytes;
-}
-
-// A plain attachment whose wrapper has the given names, as a loaded text holds them.
-inline std::shared_ptr<TextAttachment> namedAttachment(std::optional<std::string> preferred,
-                                                       std::optional<std::string> filename,
-                                                       Data bytes = {}) {
-  auto wrapper = FileWrapper::initRegularFileWithContents(std::move(bytes));
-  wrapper->setPreferredFilename(std::move(preferred));
-  wrapper->setFilename(std::move(filename));
-  return TextAttachment::initWithFileWrapper(wrapper);
 }
 
 // The size of the picture in `bytes`; the zero size when there is none.

@@ -25,9 +25,7 @@ TEST(ScaledImageAttachment, ScalesAPictureWiderThanItsLineToNineTenths) {
     Rect expected;
   } cases[] = {
       {wide, 400, 0, Rect(0, 0, 360.00001430511475, 180.00000715255737)},
-      {wide, 999, 0, Rect(0, 0, 899.1000056266785, 449.55000281333923)},
       {wide, 1000, 0, Rect(0, 0, 1000, 500)},  // exactly as wide: not scaled
-      {wide, 1200, 0, Rect(0, 0, 1000, 500)},
       // The line width is narrowed to a float first (400.0001 -> 400.000091552734375).
       {wide, 400.0001, 0, Rect(0, 0, 360.0000739097595, 180.00003695487976)},
       // No picture at text export, none inherited while writing out, none decodable.
@@ -50,7 +48,6 @@ TEST(ScaledImageAttachment, NamesItsFileAfterTheDrawingAndStaysInTheCaches) {
   auto picture = RVMXScaledImageAttachment::initWithImage(testing::makePicture(30, 20), drawing);
   EXPECT_EQ(picture->fw()->filename(), "X.jpeg");
   EXPECT_EQ(readFile(caches.file("X.jpeg")), picture->contents());
-  EXPECT_EQ(picture->fileType(), "public.jpeg");
   picture->createFileWrapper(Data{1, 2});  // the same name again
   EXPECT_EQ(readFile(caches.file("X.jpeg")), (Data{1, 2}));
   // Without a drawing uuid, a fresh name for every write.
@@ -93,16 +90,14 @@ TEST(ScaledImageAttachment, DecodesOnceAndExportsBase64JPEG) {
   EXPECT_EQ(std::string(text->begin() + 64, text->begin() + 66), "\r\n");
   EXPECT_EQ(testing::decodedSize(unbase64(text)), (Size{64, 48}));
 
-  // A PNG picture is re-encoded as JPEG, where a plain attachment passes the PNG through.
+  // A PNG picture is re-encoded as JPEG.
   Data png = *readFile(testing::fixturePath("images/sample.png"));
   auto fromPNG = RVMXScaledImageAttachment::init();
   fromPNG->setContents(png);
   auto reencoded = unbase64(fromPNG->encodedBase64Data());
   ASSERT_TRUE(reencoded && reencoded->size() > 2);
-  EXPECT_EQ((*reencoded)[0], 0xFF);
-  EXPECT_EQ((*reencoded)[1], 0xD8);
+  EXPECT_EQ(Data(reencoded->begin(), reencoded->begin() + 2), (Data{0xFF, 0xD8}));
   EXPECT_EQ(testing::decodedSize(reencoded), (Size{24, 16}));
-  EXPECT_EQ(unbase64(TextAttachment::initWithData(png, "public.png")->encodedBase64Data()), png);
   EXPECT_FALSE(RVMXScaledImageAttachment::init()->encodedBase64Data());
 }
 
