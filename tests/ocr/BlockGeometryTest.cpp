@@ -13,37 +13,36 @@ namespace {
 using testing::line;
 using testing::TunableGuard;
 
-std::shared_ptr<RVRecognitionBlock> containerWithLastChild(Rect last) {
-  auto container = RVRecognitionBlock::initWithText(u"", Rect{0, 0, 0.1, 0.1}, 0,
-                                                    RVRecognitionBlockLevelParagraph);
-  container->childBlocks()->push_back(
-      RVRecognitionBlock::initWithText(u"x", last, 0, RVRecognitionBlockLevelLine));
-  return container;
+std::shared_ptr<RVRecognitionBlock> paragraph(Rect box) {
+  return RVRecognitionBlock::initWithText(u"", box, 0, RVRecognitionBlockLevelParagraph);
+}
+
+// A paragraph whose last child is L = (0.25, 0.50, 0.25, 0.02): L.maxX = 0.5, L.minY = 0.5.
+std::shared_ptr<RVRecognitionBlock> afterL() {
+  auto p = paragraph(Rect{0, 0, 0.1, 0.1});
+  p->childBlocks()->push_back(line("x", 0.25, 0.50, 0.25, 0.02));
+  return p;
 }
 
 TEST(BlockGeometry, SameLineBoundaries) {
-  auto p = containerWithLastChild(Rect{0.25, 0.50, 0.25, 0.02});  // L.maxX = 0.5
+  auto p = afterL();
   struct Case {
     const char* name;
     double minX, minY;
     bool sameLine;
   } cases[] = {
-      {"just right, bottom raised", 0.503, 0.5007, true},
+      // The bottom must sit at least `allowance` above the last child's.
       {"bottom exactly allowance above", 0.503, 0.5 + allowance, true},
-      {"bottom level with last child", 0.503, 0.5, false},
       {"bottom a hair below the allowance", 0.503, std::nextafter(0.5 + allowance, 0.0), false},
+      // The gap to the last child: strictly positive, strictly under maxWordSeperation.
       {"touching the last child", 0.5, 0.5007, false},
       {"gap equal to maxWordSeperation", 0.5 + maxWordSeperation, 0.5007, false},
-      {"gap a hair under maxWordSeperation", std::nextafter(0.5 + maxWordSeperation, 0.0), 0.5007,
-       true},
-      {"overlapping", 0.45, 0.5007, false},
+      {"gap a hair under", std::nextafter(0.5 + maxWordSeperation, 0.0), 0.5007, true},
       {"NaN", std::numeric_limits<double>::quiet_NaN(), 0.5007, false},
   };
   for (const Case& c : cases)
     EXPECT_EQ(p->isSameLine(Rect{c.minX, c.minY, 0.1, 0.02}), c.sameLine) << c.name;
-  auto empty =
-      RVRecognitionBlock::initWithText(u"", Rect{0, 0, 1, 1}, 0, RVRecognitionBlockLevelParagraph);
-  EXPECT_FALSE(empty->isSameLine(Rect{0.503, 0.5007, 0.1, 0.02}));
+  EXPECT_FALSE(paragraph(Rect{0, 0, 1, 1})->isSameLine(Rect{0.503, 0.5007, 0.1, 0.02}));
 }
 
 TEST(BlockGeometry, SameColumnBoundaries) {
@@ -68,8 +67,7 @@ TEST(BlockGeometry, SameColumnBoundaries) {
 
 TEST(BlockGeometry, ContinuityPrefersSameLine) {
   // The last child ends where the paragraph's box ends, so one box can pass both tests.
-  auto p = RVRecognitionBlock::initWithText(u"", Rect{0.5, 0.5, 0.1, 0.02}, 0,
-                                            RVRecognitionBlockLevelParagraph);
+  auto p = paragraph(Rect{0.5, 0.5, 0.1, 0.02});
   p->childBlocks()->push_back(line("a", 0.49, 0.47, 0.011, 0.02));  // L.maxX = 0.501
   Rect both{0.502, 0.4707, 0.1, 0.0293};  // right of L, raised; top at S's bottom, aligned
   ASSERT_TRUE(p->isSameLine(both));
@@ -88,39 +86,30 @@ TEST(BlockGeometry, TwoBlockPredicates) {
   // No overlap at all: only a zero-height B is "on the same line".
   EXPECT_FALSE(any->isBlockOnSameLine(a, line("b", 0.5, 0.9, 0.25, 0.0625)));
   EXPECT_TRUE(any->isBlockOnSameLine(a, line("b", 0.5, 0.9, 0.25, 0)));
-
+  // Touching edges count as after and above.
   EXPECT_TRUE(any->isBlockOnAfterBlock(line("a", 0.5, 0, 0.1, 0.1), line("b", 0.25, 0, 0.25, 1)));
   EXPECT_FALSE(any->isBlockOnAfterBlock(line("a", 0.49, 0, 0.1, 0.1), line("b", 0.25, 0, 0.25, 1)));
   EXPECT_TRUE(any->isBlockAboveBlock(line("a", 0, 0.5, 1, 0.1), line("b", 0, 0.25, 1, 0.25)));
   EXPECT_FALSE(any->isBlockAboveBlock(line("a", 0, 0.49, 1, 0.1), line("b", 0, 0.25, 1, 0.25)));
   EXPECT_FALSE(any->isBlockAboveBlock(nullptr, a));
-
   // Column membership: strict within columnMatchAllowance of the left edge.
   auto column = line("c", 0.2, 0, 0.3, 1);
-  EXPECT_TRUE(any->isBlockInColumn(nullptr) == false);
+  EXPECT_FALSE(any->isBlockInColumn(nullptr));
   EXPECT_TRUE(column->isBlockInColumn(line("x", 0.21, 0.5, 0.1, 0.1)));
   EXPECT_FALSE(column->isBlockInColumn(line("x", 0.2 + columnMatchAllowance, 0.5, 0.1, 0.1)));
 }
 
 TEST(BlockGeometry, TunablesAreReadAtEveryCall) {
-  auto p = containerWithLastChild(Rect{0.25, 0.50, 0.25, 0.02});
+  auto p = afterL();
+  TunableGuard word(maxWordSeperation), raise(allowance), column(columnMatchAllowance);
   Rect wideGap{0.51, 0.5007, 0.1, 0.02};
   EXPECT_FALSE(p->isSameLine(wideGap));
-  {
-    TunableGuard guard(maxWordSeperation);
-    maxWordSeperation = 0.02;
-    EXPECT_TRUE(p->isSameLine(wideGap));
-  }
-  EXPECT_FALSE(p->isSameLine(wideGap));
-  {
-    TunableGuard guard(allowance);
-    allowance = 0;
-    EXPECT_TRUE(p->isSameLine(Rect{0.503, 0.5, 0.1, 0.02}));  // level bottoms now match
-  }
-  auto column = line("c", 0.2, 0, 0.3, 1);
-  TunableGuard guard(columnMatchAllowance);
+  maxWordSeperation = 0.02;
+  EXPECT_TRUE(p->isSameLine(wideGap));
+  allowance = 0;
+  EXPECT_TRUE(p->isSameLine(Rect{0.503, 0.5, 0.1, 0.02}));  // level bottoms now match
   columnMatchAllowance = 0.05;
-  EXPECT_TRUE(column->isBlockInColumn(line("x", 0.24, 0.5, 0.1, 0.1)));
+  EXPECT_TRUE(line("c", 0.2, 0, 0.3, 1)->isBlockInColumn(line("x", 0.24, 0.5, 0.1, 0.1)));
 }
 
 }  // namespace

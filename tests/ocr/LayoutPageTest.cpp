@@ -19,31 +19,6 @@ using testing::text;
 
 const std::string kArticle = testing::fixturePath("layout/article.json");
 
-// The reading order a person gives the page: heading, left column (the caption that sits
-// inside it is glued to the line above, since it arrives unmatched), right column.
-constexpr const char* kArticleText = R"(The Quiet Return of the River Otter
-
-For most of the last century the otter was a
-rumour on the lower Wend: a print in the mud,
-a half-eaten trout on a stone, nothing more.
-That has changed. Volunteers who walk the
-banks each month now log fresh spraint at
-nine of the twelve survey points, and two
-holts above the weir are in steady use.Fig. 1: Spraint sites along the lower Wend
-The survey began in 2014 with four people
-and a borrowed camera trap. It now has
-forty walkers and a shared map of sightings.
-
-Cleaner water is the usual explanation, and
-the numbers support it: nitrate levels at the
-old mill have fallen by a third since 2010.
-Yet the walkers credit the hedges too. Where
-farmers left a margin of rough grass along
-the bank, sightings doubled within two years.
-Next spring the group will add thermal
-cameras at the weir, hoping to count the
-cubs before they leave the holt.)";
-
 RVBlockArray articleLines() {
   auto bytes = readFile(kArticle);
   EXPECT_TRUE(bytes);
@@ -58,100 +33,107 @@ RVBlockArray articleLines() {
   return lines;
 }
 
-// Paragraphs of each column as "line|line|..." strings.
-std::vector<std::vector<std::string>> paragraphsOf(const RVBlockArray& columns) {
-  std::vector<std::vector<std::string>> out;
-  for (const auto& column : columns) {
+// The reading order a person gives the page, as the fixture's line numbers: columns of
+// paragraphs of lines. The heading; the left column, with the caption (17) that sits
+// inside it; the right column.
+using Layout = std::vector<std::vector<std::vector<std::size_t>>>;
+const Layout kReading = {
+    {{0}}, {{1, 3, 5}, {7, 9, 11, 13}, {17}, {18, 19, 20}}, {{2, 4, 6}, {8, 10, 12}, {14, 15, 16}}};
+
+// Its text: columns a blank line apart, lines a line feed apart, except the caption: it is
+// folded in unmatched, so it is glued to the line above.
+std::string articleText() {
+  RVBlockArray lines = articleLines();
+  std::string out;
+  for (const auto& column : kReading) {
+    std::string joined;
+    for (const auto& paragraph : column)
+      for (std::size_t i : paragraph)
+        joined += (joined.empty() || i == 17 ? "" : "\n") + text(lines.at(i));
+    out += (out.empty() ? "" : "\n\n") + joined;
+  }
+  return out;
+}
+
+std::shared_ptr<RVTextLayoutAnalyser> analysed(const RVBlockArray& lines) {
+  auto analyser = RVTextLayoutAnalyser::init();
+  analyser->addRecognitionBlocks(lines);
+  analyser->analyse(Size{2480, 3508}, RVWritingDirectionHorizontal);
+  return analyser;
+}
+
+// The analysed columns with each line given by its number in `lines`.
+Layout layoutOf(const RVTextLayoutAnalyser& analyser, const RVBlockArray& lines) {
+  Layout out;
+  for (const auto& column : *analyser.layoutBlocks()) {
     auto& paragraphs = out.emplace_back();
-    for (const auto& paragraph : *column->childBlocks()) {
-      std::string joined;
-      for (const auto& l : *paragraph->childBlocks()) joined += text(l) + "|";
-      paragraphs.push_back(joined);
+    for (const auto& paragraph : column->children()) {
+      auto& numbers = paragraphs.emplace_back();
+      for (const auto& l : paragraph->children())
+        numbers.push_back(
+            static_cast<std::size_t>(std::find(lines.begin(), lines.end(), l) - lines.begin()));
     }
   }
   return out;
 }
 
-TEST(LayoutPage, ArticleReadsHeadingThenLeftThenRightColumn) {
-  auto analyser = RVTextLayoutAnalyser::init();
-  analyser->addRecognitionBlocks(articleLines());
-  analyser->analyse(Size{2480, 3508}, RVWritingDirectionHorizontal);
-  EXPECT_EQ(toUTF8(analyser->text()), kArticleText);
-  auto paragraphs = paragraphsOf(*analyser->layoutBlocks());
-  ASSERT_EQ(paragraphs.size(), 3u);
-  EXPECT_EQ(paragraphs[0].size(), 1u);  // the heading
-  EXPECT_EQ(paragraphs[1].size(), 4u);  // three paragraphs and the caption
-  EXPECT_EQ(paragraphs[1][2], "Fig. 1: Spraint sites along the lower Wend|");
-  EXPECT_EQ(paragraphs[2].size(), 3u);
-}
-
-TEST(LayoutPage, OutOfOrderLinesGiveTheSameColumnsAndParagraphs) {
-  auto inOrder = RVTextLayoutAnalyser::init();
-  inOrder->addRecognitionBlocks(articleLines());
-  inOrder->analyse(Size{1, 1}, 0);
-  const auto want = paragraphsOf(*inOrder->layoutBlocks());
-
+TEST(LayoutPage, ArticleInAnyLineOrderGivesTheReadingOrderColumnsAndParagraphs) {
   std::mt19937 random(20240611);
-  for (int round = 0; round < 5; ++round) {
-    RVBlockArray lines = articleLines();
+  // Recogniser order (which also gives the text), bottom to top, shuffled.
+  for (int round = 0; round < 6; ++round) {
+    RVBlockArray lines = articleLines(), order = lines;
+    if (round == 1) std::reverse(order.begin(), order.end());
+    if (round > 1) std::shuffle(order.begin(), order.end(), random);
+    auto analyser = analysed(order);
+    EXPECT_EQ(layoutOf(*analyser, lines), kReading) << "round " << round;
     if (round == 0) {
-      std::reverse(lines.begin(), lines.end());  // bottom to top
-    } else {
-      std::shuffle(lines.begin(), lines.end(), random);
+      EXPECT_EQ(toUTF8(analyser->text()), articleText());
     }
-    auto analyser = RVTextLayoutAnalyser::init();
-    analyser->addRecognitionBlocks(lines);
-    analyser->analyse(Size{1, 1}, 0);
-    EXPECT_EQ(paragraphsOf(*analyser->layoutBlocks()), want) << "round " << round;
   }
 }
 
 // ---- corvel layout.
 
-std::string tool(const std::string& args) { return std::string(CORVEL_TOOL_PATH) + " " + args; }
-
-TEST(LayoutCommand, PrintsTheReadingOrderText) {
-  auto result = testing::runCommand(tool("layout " + kArticle));
-  EXPECT_EQ(result.status, 0);
-  EXPECT_EQ(result.output, std::string(kArticleText) + "\n");
+testing::CommandResult layout(const std::string& args) {
+  return testing::runCommand(std::string(CORVEL_TOOL_PATH) + " layout " + args);
 }
 
-TEST(LayoutCommand, ReadsThePageFromXMLAndBinaryPlists) {
-  auto bytes = readFile(kArticle);
-  ASSERT_TRUE(bytes);
+TEST(LayoutCommand, PrintsTheReadingOrderTextOfJSONAndPlistPages) {
   PropertyList::Array infos;
   for (const auto& block : articleLines()) infos.push_back(block->blockInformation());
   testing::TempDir dir;
-  for (auto format : {PropertyList::Format::XML, PropertyList::Format::Binary}) {
-    std::string path = dir.file(format == PropertyList::Format::XML ? "page.plist" : "page.bin");
-    ASSERT_TRUE(PropertyList(infos).writeToFile(path, format));
-    auto result = testing::runCommand(tool("layout " + path));
-    EXPECT_EQ(result.status, 0);
-    EXPECT_EQ(result.output, std::string(kArticleText) + "\n");
+  std::vector<std::string> pages = {kArticle, dir.file("page.plist"), dir.file("page.bin")};
+  ASSERT_TRUE(PropertyList(infos).writeToFile(pages[1], PropertyList::Format::XML));
+  ASSERT_TRUE(PropertyList(infos).writeToFile(pages[2], PropertyList::Format::Binary));
+  for (const std::string& page : pages) {
+    auto result = layout(page);
+    EXPECT_EQ(result.status, 0) << page;
+    EXPECT_EQ(result.output, articleText() + "\n") << page;
   }
 }
 
 TEST(LayoutCommand, JsonIsTheColumnTreeInTheDictionaryForm) {
-  auto result = testing::runCommand(tool("layout --json " + kArticle));
+  auto result = layout("--json " + kArticle);
   ASSERT_EQ(result.status, 0);
   json columns = json::parse(result.output);
-  ASSERT_TRUE(columns.is_array());
-  std::vector<std::size_t> paragraphs;
-  for (const json& column : columns) {
-    EXPECT_EQ(column["level"], 0);
-    EXPECT_EQ(column["childBlocks"][0]["level"], 1);
-    EXPECT_EQ(column["childBlocks"][0]["childBlocks"][0]["level"], 2);
-    paragraphs.push_back(column["childBlocks"].size());
-  }
-  EXPECT_EQ(paragraphs, (std::vector<std::size_t>{1, 4, 3}));
+  ASSERT_EQ(columns.size(), 3u);
   // The caption, folded into the left column, is its third paragraph.
-  EXPECT_EQ(columns[1]["childBlocks"][2]["text"], "Fig. 1: Spraint sites along the lower Wend");
+  const json& caption = columns[1]["childBlocks"][2];
+  EXPECT_EQ(columns[1]["level"], 0);
+  EXPECT_EQ(caption["level"], 1);
+  EXPECT_EQ(caption["childBlocks"][0]["level"], 2);
+  EXPECT_EQ(caption["text"], "Fig. 1: Spraint sites along the lower Wend");
   EXPECT_EQ(rectFromString(columns[0]["boundingBox"].get<std::string>()),
             (Rect{0.2, 0.9, 0.6, 0.034}));
 }
 
 TEST(LayoutCommand, MalformedInputIsAMisuse) {
   testing::TempDir dir;
+  auto write = [&](const std::string& content) {
+    std::string path = dir.file("page.json");
+    EXPECT_TRUE(writeFileAtomically(path, Data(content.begin(), content.end())));
+    return path;
+  };
   struct Case {
     const char* name;
     std::string content;
@@ -164,20 +146,14 @@ TEST(LayoutCommand, MalformedInputIsAMisuse) {
       {"too deep", std::string(300, '[') + std::string(300, ']'), "nested too deeply"},
   };
   for (const Case& c : cases) {
-    std::string path = dir.file("bad.json");
-    ASSERT_TRUE(writeFileAtomically(path, Data(c.content.begin(), c.content.end())));
-    auto result = testing::runCommand(tool("layout " + path + " 2>&1"));
+    auto result = layout(write(c.content) + " 2>&1");
     EXPECT_EQ(result.status, 2) << c.name;
     EXPECT_NE(result.output.find(c.message), std::string::npos) << c.name << ": " << result.output;
   }
-  EXPECT_EQ(testing::runCommand(tool("layout " + dir.file("missing") + " 2>/dev/null")).status, 2);
-  EXPECT_EQ(testing::runCommand(tool("layout 2>/dev/null")).status, 2);
-  EXPECT_EQ(testing::runCommand(tool("layout --bogus " + kArticle + " 2>/dev/null")).status, 2);
+  for (std::string args : {dir.file("missing"), std::string(), "--bogus " + kArticle})
+    EXPECT_EQ(layout(args + " 2>/dev/null").status, 2) << args;
   // Blocks missing every key are still blocks: an empty page reads as empty text.
-  std::string path = dir.file("empty.json");
-  std::string content = "[{}, {\"boundingBox\": 7}]";
-  ASSERT_TRUE(writeFileAtomically(path, Data(content.begin(), content.end())));
-  auto result = testing::runCommand(tool("layout " + path));
+  auto result = layout(write("[{}, {\"boundingBox\": 7}]"));
   EXPECT_EQ(result.status, 0);
   EXPECT_EQ(result.output, "\n");
 }
