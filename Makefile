@@ -25,7 +25,10 @@ bench: build
 	@for b in $(RELEASE_DIR)/bench/bench_*; do \
 	  [ -x "$$b" ] || continue; echo "== $$b"; "$$b" || exit 1; done
 
-demo: build
+# The demo needs only the library and the program, not the test suites.
+demo: deps
+	$(call configure,$(RELEASE_DIR),-DCMAKE_BUILD_TYPE=Release)
+	cmake --build $(RELEASE_DIR) -j $(JOBS) --target corvel
 	$(RELEASE_DIR)/tools/corvel/corvel ocr tests/fixtures/ocr/sample.png
 
 format:
