@@ -22,6 +22,7 @@
 #include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Image.h"
+#include "JsonConversion.h"
 
 namespace corvel::tool {
 
@@ -50,30 +51,6 @@ bool isURL(const std::string& input) {
 
 std::shared_ptr<Image> imageFor(const std::string& input) {
   return isURL(input) ? Image::initByReferencingURL(input) : Image::initByReferencingFile(input);
-}
-
-json jsonFromPropertyList(const PropertyList& value) {
-  return std::visit(
-      [](const auto& v) -> json {
-        using T = std::decay_t<decltype(v)>;
-        if constexpr (std::is_same_v<T, String>) {
-          return toUTF8(v);
-        } else if constexpr (std::is_same_v<T, PropertyList::Array>) {
-          json array = json::array();
-          for (const auto& element : v) array.push_back(jsonFromPropertyList(element));
-          return array;
-        } else if constexpr (std::is_same_v<T, PropertyList::Dictionary>) {
-          json object = json::object();
-          for (const auto& [key, element] : v) object[key] = jsonFromPropertyList(element);
-          return object;
-        } else if constexpr (std::is_same_v<T, bool> || std::is_same_v<T, std::int64_t> ||
-                             std::is_same_v<T, std::uint64_t> || std::is_same_v<T, double>) {
-          return v;
-        } else {
-          return nullptr;  // kinds the block form never holds
-        }
-      },
-      value.value());
 }
 
 std::string describe(const Error& error) {
