@@ -17,52 +17,41 @@ testing::CommandResult md(const std::string& document, const std::string& args) 
                              "' 2>/dev/null");
 }
 
-TEST(MdTool, PrintsTheCommandsAnswerAsJSON) {
+TEST(MdTool, PrintsTheAnswerAsJSONOrTheEditedDocument) {
+  auto line = [](const std::string& json) { return json + "\n"; };
   struct Case {
     std::string document, args, output;
+    int status = 0;
   } cases[] = {
       {"a\nb", "insertTaskList --selection 0,3",
-       R"({"text":"- [ ] a\n- [ ] b","replacementRange":[0,3],"selectionRange":[0,15]})"},
+       line(R"({"text":"- [ ] a\n- [ ] b","replacementRange":[0,3],"selectionRange":[0,15]})")},
       {"## T", "setMarkdownHeaderLevel --selection 0,0 --level 2",
-       R"({"text":"","replacementRange":[0,3],"selectionRange":null})"},
+       line(R"({"text":"","replacementRange":[0,3],"selectionRange":null})")},
       {"abc", "insertInlineCodeBlock --selection 1,1",
-       R"({"text":"`b`","replacementRange":null,"selectionRange":null})"},
+       line(R"({"text":"`b`","replacementRange":null,"selectionRange":null})")},
       // Ranges count UTF-16 units: the emoji is two.
       {"\xF0\x9F\x98\x80 a\nb", "insertQuote --selection 3,0",
-       R"({"text":"> 😀 a\n","replacementRange":[0,5],"selectionRange":[5,0]})"},
+       line(R"({"text":"> 😀 a\n","replacementRange":[0,5],"selectionRange":[5,0]})")},
       {"[a](u)", "lineContainsMarkdownLink --selection 1,0",
-       R"({"result":true,"linkRange":[0,6],"textRange":[1,1]})"},
+       line(R"({"result":true,"linkRange":[0,6],"textRange":[1,1]})")},
+      // --apply prints the document with the edit made, line endings and all.
+      {"a\r\nb\r\n", "insertNumberedList --selection 0,6 --apply", "1. a\r\n2. b\r\n"},
+      {"see this", "insertMarkdownLink --selection 4,4 --url http://x.org --apply",
+       "see [this](http://x.org)"},
+      // Misuse: status 2 and nothing printed.
+      {"abc", "insertTaskLists --selection 0,0", "", 2},  // unknown command
+      {"abc", "insertTaskList", "", 2},                   // no selection
+      {"abc", "insertTaskList --selection 0", "", 2},     // malformed range
+      {"abc", "insertTaskList --selection 0,99", "", 2},  // beyond the document
+      {"abc", "insertTaskList --selection 18446744073709551615,1", "", 2},
+      {"abc", "insertTable --selection 0,0 --rows 1", "", 2},      // missing --columns
+      {"abc", "insertTaskList --selection 0,0 --level 2", "", 2},  // option of another command
+      {"abc", "lineContainsMarkdownLink --selection 0,0 --apply", "", 2},
   };
   for (const Case& c : cases) {
     testing::CommandResult r = md(c.document, c.args);
-    EXPECT_EQ(r.status, 0) << c.args;
-    EXPECT_EQ(r.output, c.output + "\n") << c.args;
-  }
-}
-
-TEST(MdTool, ApplyPrintsTheEditedDocument) {
-  testing::CommandResult r = md("a\r\nb\r\n", "insertNumberedList --selection 0,6 --apply");
-  EXPECT_EQ(r.status, 0);
-  EXPECT_EQ(r.output, "1. a\r\n2. b\r\n");
-  r = md("see this", "insertMarkdownLink --selection 4,4 --url http://x.org --apply");
-  EXPECT_EQ(r.output, "see [this](http://x.org)");
-}
-
-TEST(MdTool, MisuseExitsWithStatusTwo) {
-  const char* bad[] = {
-      "insertTaskLists --selection 0,0",  // unknown command
-      "insertTaskList",                   // no selection
-      "insertTaskList --selection 0",     // malformed range
-      "insertTaskList --selection 0,99",  // beyond the document
-      "insertTaskList --selection 18446744073709551615,1",
-      "insertTable --selection 0,0 --rows 1",      // missing --columns
-      "insertTaskList --selection 0,0 --level 2",  // option of another command
-      "lineContainsMarkdownLink --selection 0,0 --apply",
-  };
-  for (const char* args : bad) {
-    testing::CommandResult r = md("abc", args);
-    EXPECT_EQ(r.status, 2) << args;
-    EXPECT_EQ(r.output, "") << args;
+    EXPECT_EQ(r.status, c.status) << c.args;
+    EXPECT_EQ(r.output, c.output) << c.args;
   }
 }
 

@@ -6,14 +6,6 @@
 
 namespace corvel::testing {
 
-namespace {
-
-bool intersectionIsNonEmpty(Range a, Range b) {
-  return std::max(a.location, b.location) < std::min(a.max(), b.max());
-}
-
-}  // namespace
-
 std::vector<MarkdownCommands::LineItem> referenceLinesForRange(const String& text, Range range) {
   // The library's documented clamping, done independently.
   std::uint64_t size = text.size();
@@ -26,7 +18,9 @@ std::vector<MarkdownCommands::LineItem> referenceLinesForRange(const String& tex
   std::uint64_t position = 0;
   for (std::size_t i = 0; i < all.size(); ++i) {
     Range r{position, all[i].size()};
-    bool touches = intersectionIsNonEmpty(s, r) || (r.location <= loc && loc < r.max());
+    // Shares a unit with the selection, or holds its location.
+    bool touches = std::max(s.location, r.location) < std::min(s.max(), r.max()) ||
+                   (r.location <= loc && loc < r.max());
     bool lastWithoutFeed = i + 1 == all.size() && taken.empty() && lastCharacter(all[i]) != u'\n';
     if (touches || lastWithoutFeed) taken.push_back({all[i], r});
     position = r.max();

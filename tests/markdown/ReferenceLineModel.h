@@ -3,6 +3,7 @@
 // differential test holds the library's fast path to it.
 #pragma once
 
+#include <limits>
 #include <ostream>
 #include <vector>
 
@@ -17,8 +18,15 @@ String applyEdit(const String& text, Range range, const String& replacement);
 
 }  // namespace corvel::testing
 
-// Readable failure messages.
 namespace corvel {
+namespace md = MarkdownCommands;
+
+// The largest selection location or length: every clamp and overflow guard meets it.
+inline constexpr std::uint64_t kMax = std::numeric_limits<std::uint64_t>::max();
+// What an out range holds before a call, to tell "left alone" from "written".
+inline constexpr Range kUnwritten{12345, 6789};
+
+// Readable failure messages.
 inline void PrintTo(const Range& r, std::ostream* os) {
   *os << "(" << r.location << ", " << r.length << ")";
 }

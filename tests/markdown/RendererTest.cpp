@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <regex>
+#include <type_traits>
 
 #include "Corvelbase/MarkdownCommands.h"
 #include "Corvelbase/platform/Files.h"
@@ -11,8 +12,6 @@
 
 namespace corvel {
 namespace {
-
-namespace md = MarkdownCommands;
 
 std::string render(const String& markdown) {
   testing::TempDir dir;
@@ -32,20 +31,25 @@ std::size_t count(const std::string& html, const std::string& pattern) {
       std::distance(std::sregex_iterator(html.begin(), html.end(), re), std::sregex_iterator()));
 }
 
+// `text` rendered once `command` edited it, as an editor applies the answer. Commands that
+// also report a selection get nullptr for it.
 template <typename Command>
-String edited(const String& text, Range selection, Command command) {
+std::string renderEdited(const String& text, Range selection, Command command) {
   Range replaced;
-  String out = command(text, selection, &replaced);
-  return testing::applyEdit(text, replaced, out);
+  String out;
+  if constexpr (std::is_invocable_v<Command, const String&, Range, Range*, Range*>)
+    out = command(text, selection, &replaced, nullptr);
+  else
+    out = command(text, selection, &replaced);
+  return render(testing::applyEdit(text, replaced, out));
 }
 
 TEST(Rendered, TableHasTheAskedColumnsAndRows) {
-  const String doc = u"Intro\n\nMore text\n";
   for (std::uint64_t columns : {1, 3, 5}) {
-    String text = edited(doc, {0, 0}, [&](const String& t, Range r, Range* out) {
-      return md::insertTable(t, r, 3, columns, out);
-    });
-    std::string html = render(text);
+    std::string html =
+        renderEdited(u"Intro\n\nMore text\n", {0, 0}, [&](const String& t, Range r, Range* out) {
+          return md::insertTable(t, r, 3, columns, out);
+        });
     ASSERT_EQ(count(html, "<table>"), 1u) << html;
     EXPECT_EQ(count(html, "<th[ >]"), columns) << html;
     EXPECT_EQ(count(html, "<td[ >]"), 2 * columns) << html;  // rows 3 = header + 2 body rows
@@ -53,27 +57,19 @@ TEST(Rendered, TableHasTheAskedColumnsAndRows) {
   }
 }
 
-TEST(Rendered, TaskListHasCheckboxes) {
-  const String doc = u"buy milk\nwalk dog\n";
-  std::string html = render(edited(doc, {0, doc.size()}, [](auto& t, Range r, Range* o) {
-    return md::insertTaskList(t, r, o, nullptr);
-  }));
-  EXPECT_EQ(count(html, "<input type=\"checkbox\""), 2u) << html;
-  EXPECT_EQ(count(html, "checked"), 0u) << html;
-  EXPECT_NE(html.find("walk dog"), std::string::npos) << html;
-}
-
-TEST(Rendered, BulletsAndNumbersMakeLists) {
+TEST(Rendered, TasksBulletsAndNumbersMakeLists) {
   const String doc = u"alpha\nbeta\ngamma\n";
-  std::string bullets = render(edited(doc, {0, doc.size()}, [](auto& t, Range r, Range* o) {
-    return md::insertUnorderedList(t, r, o, nullptr);
-  }));
+  const Range all{0, doc.size()};
+  std::string tasks = renderEdited(doc, all, md::insertTaskList);
+  EXPECT_EQ(count(tasks, "<input type=\"checkbox\""), 3u) << tasks;
+  EXPECT_EQ(count(tasks, "checked"), 0u) << tasks;
+  EXPECT_NE(tasks.find("gamma"), std::string::npos) << tasks;
+
+  std::string bullets = renderEdited(doc, all, md::insertUnorderedList);
   EXPECT_EQ(count(bullets, "<ul>"), 1u) << bullets;
   EXPECT_EQ(count(bullets, "<li>"), 3u) << bullets;
 
-  std::string numbers = render(edited(doc, {0, doc.size()}, [](auto& t, Range r, Range* o) {
-    return md::insertNumberedList(t, r, o, nullptr);
-  }));
+  std::string numbers = renderEdited(doc, all, md::insertNumberedList);
   EXPECT_EQ(count(numbers, "<ol>"), 1u) << numbers;
   EXPECT_EQ(count(numbers, "<li>(alpha|beta|gamma)</li>"), 3u) << numbers;
   EXPECT_LT(numbers.find("alpha"), numbers.find("gamma"));
@@ -81,26 +77,23 @@ TEST(Rendered, BulletsAndNumbersMakeLists) {
 
 TEST(Rendered, QuoteAndRule) {
   const String doc = u"first\n\nquote me\nand me\n";
-  std::string quoted = render(edited(
-      doc, {7, 12}, [](auto& t, Range r, Range* o) { return md::insertQuote(t, r, o, nullptr); }));
+  std::string quoted = renderEdited(doc, {7, 12}, md::insertQuote);
   EXPECT_TRUE(std::regex_search(quoted, std::regex("<blockquote>\\s*<p>quote me\\s+and me</p>")))
       << quoted;
   EXPECT_NE(quoted.find("<p>first</p>"), std::string::npos) << quoted;
 
-  std::string ruled = render(edited(doc, {7, 0}, md::insertHorizontalLine));
+  std::string ruled = renderEdited(doc, {7, 0}, md::insertHorizontalLine);
   EXPECT_EQ(count(ruled, "<hr />"), 1u) << ruled;
   EXPECT_LT(ruled.find("<hr />"), ruled.find("quote me")) << ruled;
 }
 
 TEST(Rendered, CodeBlockHoldsTheSelectedText) {
-  const String whole = u"before\nlet x = 1;\nafter\n";
   auto fence = [](const String& t, Range r, Range* o) { return *md::insertCodeBlock(t, r, o); };
-  std::string html = render(edited(whole, {7, 10}, fence));
+  std::string html = renderEdited(u"before\nlet x = 1;\nafter\n", {7, 10}, fence);
   EXPECT_NE(html.find("<pre><code>let x = 1;\n</code></pre>"), std::string::npos) << html;
   EXPECT_NE(html.find("<p>after</p>"), std::string::npos) << html;
-
   // From the middle of a line the fence still starts a line of its own.
-  std::string mid = render(edited(u"say hello world\n", {4, 5}, fence));
+  std::string mid = renderEdited(u"say hello world\n", {4, 5}, fence);
   EXPECT_NE(mid.find("<pre><code>hello\n</code></pre>"), std::string::npos) << mid;
 }
 

@@ -7,77 +7,67 @@
 namespace corvel {
 namespace {
 
+// `corvel ARGUMENTS` (which may redirect standard input): its exit status and standard output.
 struct CommandCase {
-  std::string arguments;  // after the program name; may redirect standard input
+  std::string arguments;
   int status;
   std::string output;
 };
 
-void runCases(const std::vector<CommandCase>& cases) {
+// A file `name` in `dir` holding `text`, its path quoted for the shell.
+std::string file(const testing::TempDir& dir, const std::string& name, const std::string& text) {
+  std::ofstream(dir.file(name)) << text;
+  return "'" + dir.file(name) + "'";
+}
+
+TEST(StringCommands, UtiLangAndHeaderPrintTheAnswerOrExitWithWhy) {
+  testing::TempDir dir;
+  std::string notes = file(dir, "notes.MD", "# x"), folder = "'" + dir.path() + "'";
+  std::string de = file(dir, "de.txt",
+                        "Wir haben das ganze Wochenende den Dachboden aufgeräumt und alte Briefe "
+                        "gefunden.");
+  std::string digits = file(dir, "digits.txt", "1234 5678 90"), empty = file(dir, "e.txt", "");
+  std::string bad = file(dir, "bad.txt", "\xff\xfe\x80 \xc3"), missing = "'" + dir.file("no") + "'";
+  std::string mail =
+      file(dir, "m.eml", "From: Ada Lovelace <ada@example.com>\r\nSubject: Grüße\r\n\r\nBody\r\n");
+  const CommandCase cases[] = {
+      // uti: the type, then everything it conforms to.
+      {"uti public.png", 0, "public.png\npublic.image\npublic.data\npublic.content\npublic.item\n"},
+      {"uti " + notes, 0,
+       "net.daringfireball.markdown\npublic.plain-text\npublic.text\npublic.data\n"
+       "public.content\npublic.item\n"},
+      {"uti " + folder, 0, "public.folder\npublic.directory\npublic.item\n"},
+      {"uti com.example.unknown", 0, "com.example.unknown\n"},
+      {"uti", 2, ""},
+      {"uti ''", 2, ""},
+      // lang: the code from a file or standard input; 1 when undetermined.
+      {"lang " + de, 0, "de\n"},
+      {"lang < " + de, 0, "de\n"},
+      {"lang - < " + de, 0, "de\n"},
+      {"lang " + digits, 1, ""},
+      {"lang " + empty, 1, ""},
+      {"lang " + bad, 1, ""},
+      {"lang " + missing, 2, ""},
+      {"lang " + folder, 2, ""},
+      {"lang --fast", 2, ""},
+      // header: the value, or with --address the address; 1 when there is none.
+      {"header subject " + mail, 0, "Grüße\n"},
+      {"header From " + mail, 0, "Ada Lovelace <ada@example.com>\n"},
+      {"header From --address " + mail, 0, "ada@example.com\n"},
+      {"header --address From " + mail, 0, "ada@example.com\n"},
+      {"header From --address < " + mail, 0, "ada@example.com\n"},
+      {"header Subject --address " + mail, 1, ""},
+      {"header 'Subject(' " + mail, 1, ""},
+      {"header", 2, ""},
+      {"header From " + mail + " extra", 2, ""},
+      {"header From " + missing, 2, ""},
+  };
   for (const CommandCase& c : cases) {
     testing::CommandResult result =
         testing::runCommand(std::string(CORVEL_TOOL_PATH) + " " + c.arguments + " 2>/dev/null");
     EXPECT_EQ(result.status, c.status) << c.arguments;
     EXPECT_EQ(result.output, c.output) << c.arguments;
   }
-}
-
-TEST(StringCommands, UtiPrintsTheTypeAndEverythingItConformsTo) {
-  testing::TempDir dir;
-  std::ofstream(dir.file("notes.MD")) << "# x";
-  runCases({
-      {"uti public.png", 0, "public.png\npublic.image\npublic.data\npublic.content\npublic.item\n"},
-      {"uti '" + dir.file("notes.MD") + "'", 0,
-       "net.daringfireball.markdown\npublic.plain-text\npublic.text\npublic.data\n"
-       "public.content\npublic.item\n"},
-      {"uti '" + dir.path() + "'", 0, "public.folder\npublic.directory\npublic.item\n"},
-      {"uti com.example.unknown", 0, "com.example.unknown\n"},
-      {"uti", 2, ""},
-      {"uti a b", 2, ""},
-      {"uti ''", 2, ""},
-  });
-}
-
-TEST(StringCommands, LangPrintsTheCodeOrNothing) {
-  testing::TempDir dir;
-  std::ofstream(dir.file("de.txt"))
-      << "Wir haben das ganze Wochenende den Dachboden aufgeräumt und alte Briefe gefunden.";
-  std::ofstream(dir.file("digits.txt")) << "1234 5678 90";
-  std::ofstream(dir.file("empty.txt"));
-  std::ofstream(dir.file("bad.txt")) << "\xff\xfe\x80 \xc3";
-  runCases({
-      {"lang '" + dir.file("de.txt") + "'", 0, "de\n"},
-      {"lang < '" + dir.file("de.txt") + "'", 0, "de\n"},
-      {"lang - < '" + dir.file("de.txt") + "'", 0, "de\n"},
-      {"lang '" + dir.file("digits.txt") + "'", 1, ""},
-      {"lang '" + dir.file("empty.txt") + "'", 1, ""},
-      {"lang '" + dir.file("bad.txt") + "'", 1, ""},
-      {"lang '" + dir.file("missing.txt") + "'", 2, ""},
-      {"lang '" + dir.path() + "'", 2, ""},
-      {"lang a b", 2, ""},
-      {"lang --fast", 2, ""},
-  });
-}
-
-TEST(StringCommands, HeaderPrintsTheValueOrTheAddress) {
-  testing::TempDir dir;
-  std::ofstream(dir.file("m.eml")) << "From: Ada Lovelace <ada@example.com>\r\n"
-                                      "Subject: Grüße\r\n\r\nBody\r\n";
-  std::string message = "'" + dir.file("m.eml") + "'";
-  runCases({
-      {"header subject " + message, 0, "Grüße\n"},
-      {"header From " + message, 0, "Ada Lovelace <ada@example.com>\n"},
-      {"header From --address " + message, 0, "ada@example.com\n"},
-      {"header --address From " + message, 0, "ada@example.com\n"},
-      {"header From --address < " + message, 0, "ada@example.com\n"},
-      {"header Subject --address " + message, 1, ""},
-      {"header To " + message, 1, ""},
-      {"header 'Subject(' " + message, 1, ""},
-      {"header", 2, ""},
-      {"header From " + message + " extra", 2, ""},
-      {"header From --verbose " + message, 2, ""},
-      {"header From '" + dir.file("missing.eml") + "'", 2, ""},
-  });
 }
 
 }  // namespace

