@@ -50,7 +50,7 @@ TEST(LanguageCatalogue, HasItsFourteenEntriesWithTheirQuirks) {
     }
     auto it = catalogue.find(row.key);
     ASSERT_NE(it, catalogue.end()) << row.key;
-    EXPECT_EQ(it->second, PropertyList(entry)) << row.key;
+    EXPECT_EQ(it->second, PropertyList(entry)) << row.key << ": " << stringAt(it->second, "name");
   }
 }
 
