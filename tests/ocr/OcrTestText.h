@@ -3,11 +3,10 @@
 #pragma once
 
 #include <algorithm>
-#include <fstream>
-#include <sstream>
 #include <string>
 #include <vector>
 
+#include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/String.h"
 #include "support/TestSupport.h"
 
@@ -15,10 +14,8 @@ namespace corvel::testing {
 
 // The source text of a fixture page (tests/fixtures/ocr/NAME.txt).
 inline std::string fixtureText(const std::string& name) {
-  std::ifstream in(fixturePath("ocr/" + name + ".txt"));
-  std::stringstream text;
-  text << in.rdbuf();
-  return text.str();
+  auto bytes = readFile(fixturePath("ocr/" + name + ".txt"));
+  return bytes ? std::string(bytes->begin(), bytes->end()) : std::string();
 }
 
 // Runs of white space become one blank (or nothing, for scripts written without
