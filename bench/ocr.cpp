@@ -36,6 +36,7 @@
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
+#include "support/TextDistance.h"
 
 extern char** environ;
 
@@ -84,39 +85,14 @@ std::vector<Sample> lines(std::size_t limit) {
   return out;
 }
 
-// Edit distance over code points after collapsing white space, divided by the
-// expected length.
+// Edit distance after normalising white space, over all texts, divided by the expected
+// length.
 double errorRate(const std::vector<std::string>& expected, const std::vector<std::string>& got) {
-  auto normal = [](const std::string& utf8) {
-    std::u32string out;
-    String s = fromUTF8(utf8);
-    bool space = false;
-    for (char16_t c : s) {
-      if (c == u' ' || c == u'\n' || c == u'\t' || c == u'\r' || c == u'\f') {
-        space = !out.empty();
-        continue;
-      }
-      if (space) out += U' ';
-      space = false;
-      out += c;
-    }
-    return out;
-  };
   double errors = 0, length = 0;
   for (std::size_t k = 0; k < expected.size(); ++k) {
-    std::u32string a = normal(expected[k]), b = normal(k < got.size() ? got[k] : "");
-    std::vector<std::size_t> row(b.size() + 1);
-    for (std::size_t j = 0; j <= b.size(); ++j) row[j] = j;
-    for (std::size_t i = 1; i <= a.size(); ++i) {
-      std::size_t diagonal = row[0];
-      row[0] = i;
-      for (std::size_t j = 1; j <= b.size(); ++j) {
-        std::size_t up = row[j];
-        row[j] = std::min({row[j] + 1, row[j - 1] + 1, diagonal + (a[i - 1] == b[j - 1] ? 0 : 1)});
-        diagonal = up;
-      }
-    }
-    errors += static_cast<double>(row[b.size()]);
+    std::u32string a = corvel::testing::normalised(expected[k]);
+    std::u32string b = corvel::testing::normalised(k < got.size() ? got[k] : "");
+    errors += static_cast<double>(corvel::testing::editDistance(a, b));
     length += static_cast<double>(a.size());
   }
   return length > 0 ? errors / length : 0;
