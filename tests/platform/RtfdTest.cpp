@@ -189,7 +189,7 @@ TEST(Rtfd, AttachmentNamesAreMadeSafeAndUnique) {
 
 TEST(Rtfd, ReadsWhatTheDesktopEditorsWrite) {
   // The shape of a bundle's TXT.rtf as the platform's editors save it: a code page, a
-  // font table, cocoa control words, a raw 8-bit placeholder and \'xx text.
+  // font table, the editors' own version control words, a raw 8-bit placeholder and \'xx text.
   std::string rtf =
       "{\\rtf1\\ansi\\ansicpg1252\\cocoartf2639\n"
       "{\\fonttbl\\f0\\fswiss\\fcharset0 Helvetica;}\n{\\colortbl;\\red255\\green255\\blue255;}\n"
