@@ -10,11 +10,11 @@
 #include <nlohmann/json.hpp>
 #include <optional>
 #include <set>
-#include <sstream>
 
 #include "Commands.h"
 #include "Corvelbase/MarkdownCommands.h"
 #include "Corvelbase/platform/Files.h"
+#include "TextInput.h"
 
 namespace corvel::tool {
 
@@ -258,22 +258,6 @@ std::optional<std::string> checkOptions(const Options& o) {
   return std::nullopt;
 }
 
-std::optional<String> readDocument(const Options& o) {
-  std::string bytes;
-  if (o.file) {
-    std::optional<Data> data = readFile(*o.file);
-    if (!data) return std::nullopt;
-    bytes.assign(data->begin(), data->end());
-  } else {
-    std::ostringstream in;
-    in << std::cin.rdbuf();
-    bytes = in.str();
-  }
-  // The UTF-8 reader counts in 32-bit lengths.
-  if (bytes.size() > static_cast<std::size_t>(INT32_MAX)) return std::nullopt;
-  return fromUTF8(bytes);
-}
-
 int runQuery(const Options& o, const String& document) {
   json out;
   const Range selection = o.selection.value_or(Range{});
@@ -337,10 +321,8 @@ int run(const Arguments& args) {
 
   String document;
   if (o.command != "headerForLevel" && o.command != "justifyString") {
-    std::optional<String> read = readDocument(o);
-    if (!read)
-      return misuse("cannot read the document" + (o.file ? " " + *o.file : std::string()) +
-                    " (missing, unreadable or over 2 GB)");
+    std::optional<String> read = readTextInput("md", o.file.value_or(""));
+    if (!read) return 2;
     document = std::move(*read);
   }
   if (o.selection) {
