@@ -147,6 +147,21 @@ Run runOurs(const std::vector<Sample>& samples, bool fast, TesseractRecognizer& 
 
 bool commandAvailable() { return std::system("command -v tesseract >/dev/null 2>&1") == 0; }
 
+// Starts `tesseract IMAGE OUT -l eng` with its output silenced; false when it cannot start.
+bool spawnTesseract(const std::string& image, const std::string& outBase, char** envp, pid_t* pid) {
+  std::vector<std::string> args{"tesseract", image, outBase, "-l", "eng"};
+  std::vector<char*> argv;
+  for (auto& a : args) argv.push_back(a.data());
+  argv.push_back(nullptr);
+  posix_spawn_file_actions_t quiet;
+  posix_spawn_file_actions_init(&quiet);
+  posix_spawn_file_actions_addopen(&quiet, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
+  posix_spawn_file_actions_addopen(&quiet, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
+  bool started = posix_spawnp(pid, "tesseract", &quiet, nullptr, argv.data(), envp) == 0;
+  posix_spawn_file_actions_destroy(&quiet);
+  return started;
+}
+
 // The command on every image, kCommandProcesses at a time, each reading its image and
 // writing its text to a file.
 Run runCommand(const std::vector<Sample>& samples, const fs::path& work) {
@@ -160,22 +175,14 @@ Run runCommand(const std::vector<Sample>& samples, const fs::path& work) {
   std::vector<char*> envp;
   for (auto& e : env) envp.push_back(e.data());
   envp.push_back(nullptr);
-  posix_spawn_file_actions_t quiet;
-  posix_spawn_file_actions_init(&quiet);
-  posix_spawn_file_actions_addopen(&quiet, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
-  posix_spawn_file_actions_addopen(&quiet, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
 
   auto start = std::chrono::steady_clock::now();
   std::size_t next = 0, running = 0;
   auto outBase = [&](std::size_t i) { return (work / ("out-" + std::to_string(i))).string(); };
   while (next < samples.size() || running > 0) {
     while (running < kCommandProcesses && next < samples.size()) {
-      std::vector<std::string> args{"tesseract", samples[next].image, outBase(next), "-l", "eng"};
-      std::vector<char*> argv;
-      for (auto& a : args) argv.push_back(a.data());
-      argv.push_back(nullptr);
       pid_t pid = 0;
-      if (posix_spawnp(&pid, "tesseract", &quiet, nullptr, argv.data(), envp.data()) == 0) {
+      if (spawnTesseract(samples[next].image, outBase(next), envp.data(), &pid)) {
         ++running;
       } else {
         ++run.failures;
@@ -189,7 +196,6 @@ Run runCommand(const std::vector<Sample>& samples, const fs::path& work) {
     }
   }
   run.seconds = since(start);
-  posix_spawn_file_actions_destroy(&quiet);
   for (std::size_t i = 0; i < samples.size(); ++i) run.texts[i] = readText(outBase(i) + ".txt");
   return run;
 }
@@ -197,23 +203,13 @@ Run runCommand(const std::vector<Sample>& samples, const fs::path& work) {
 // Peak resident memory of one command on `sample`, in MiB. Measured before this process
 // has grown: a spawned child's peak starts from its parent's at the time of spawning.
 double commandPeakMiB(const Sample& sample, const fs::path& work) {
-  std::string out = (work / "peak").string();
-  std::vector<std::string> args{"tesseract", sample.image, out, "-l", "eng"};
-  std::vector<char*> argv;
-  for (auto& a : args) argv.push_back(a.data());
-  argv.push_back(nullptr);
-  posix_spawn_file_actions_t quiet;
-  posix_spawn_file_actions_init(&quiet);
-  posix_spawn_file_actions_addopen(&quiet, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
-  posix_spawn_file_actions_addopen(&quiet, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
   pid_t pid = 0;
   double peak = -1;
-  if (posix_spawnp(&pid, "tesseract", &quiet, nullptr, argv.data(), environ) == 0) {
+  if (spawnTesseract(sample.image, (work / "peak").string(), environ, &pid)) {
     int status = 0;
     rusage usage{};
     if (wait4(pid, &status, 0, &usage) == pid) peak = usage.ru_maxrss / 1024.0;
   }
-  posix_spawn_file_actions_destroy(&quiet);
   return peak;
 }
 
