@@ -23,4 +23,8 @@ struct Bitmap::Native {
 // colour map; nullptr (and `pix` freed) when that fails or the size is out of budget.
 std::shared_ptr<Bitmap> bitmapFromPix(PIX* pix, std::string* failure);
 
+// Decodes a PNG file's bytes; nullptr with *failure saying why when they are not one
+// whole PNG image within the pixel budget.
+PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::string* failure);
+
 }  // namespace corvel

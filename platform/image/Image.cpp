@@ -64,6 +64,8 @@ std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure) {
                " pixels; at most " + std::to_string(kMaxImagePixels / 1'000'000) + " megapixels)";
     return nullptr;
   }
+  if (format == IFF_PNG)
+    return bitmapFromPix(decodePNG(bytes.data(), bytes.size(), failure), failure);
   PIX* pix = pixReadMem(bytes.data(), bytes.size());
   if (!pix) {
     *failure = "the " + formatName(format) + " image is corrupt or truncated";

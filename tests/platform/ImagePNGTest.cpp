@@ -1,0 +1,211 @@
+// PNG reading against images written here with libpng in every colour type, bit depth
+// and interlacing, so each transformation the reader asks libpng for is checked against
+// what the pixels are by definition.
+#include <gtest/gtest.h>
+#include <png.h>
+
+#include <csetjmp>
+
+#include "Corvelbase/platform/Image.h"
+
+namespace corvel {
+namespace {
+
+// 11 x 7 crosses every Adam7 pass boundary.
+constexpr int kWidth = 11, kHeight = 7;
+
+struct Spec {
+  const char* name;
+  int colorType;
+  int bitDepth;
+  bool interlaced = false;
+  bool transparentKey = false;  // a tRNS chunk naming one colour (or palette entry)
+};
+
+// The sample of channel `c` at (x, y) for a bit depth, varied enough that a swapped
+// byte, row or channel shows.
+int sampleAt(int x, int y, int c, int bitDepth) {
+  int max = (1 << bitDepth) - 1;
+  return (x * 7 + y * 13 + c * 29) % (max + 1);
+}
+
+// What an 8-bit reader must make of a sample: low depths scale up, 16 bits keep the high byte.
+int toEight(int sample, int bitDepth) {
+  if (bitDepth == 16) return sample >> 8;
+  return sample * 255 / ((1 << bitDepth) - 1);
+}
+
+void appendBytes(png_structp png, png_bytep bytes, png_size_t length) {
+  auto* out = static_cast<Data*>(png_get_io_ptr(png));
+  out->insert(out->end(), bytes, bytes + length);
+}
+
+int channelsOf(int colorType) {
+  switch (colorType) {
+    case PNG_COLOR_TYPE_GRAY_ALPHA:
+      return 2;
+    case PNG_COLOR_TYPE_RGB:
+      return 3;
+    case PNG_COLOR_TYPE_RGB_ALPHA:
+      return 4;
+    default:
+      return 1;  // grey, or a palette index
+  }
+}
+
+// The palette maps index i to (i*9, 255-i*9, i*3) mod 256.
+png_color paletteEntry(int i) {
+  return {static_cast<png_byte>(i * 9), static_cast<png_byte>(255 - i * 9),
+          static_cast<png_byte>(i * 3)};
+}
+
+Data writePng(const Spec& spec) {
+  Data out;
+  png_structp png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
+  png_infop info = png_create_info_struct(png);
+  if (setjmp(png_jmpbuf(png))) {
+    png_destroy_write_struct(&png, &info);
+    return {};
+  }
+  png_set_write_fn(png, &out, appendBytes, nullptr);
+  png_set_IHDR(png, info, kWidth, kHeight, spec.bitDepth, spec.colorType,
+               spec.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
+               PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
+  png_color palette[256];
+  for (int i = 0; i < 256; ++i) palette[i] = paletteEntry(i);
+  if (spec.colorType == PNG_COLOR_TYPE_PALETTE)
+    png_set_PLTE(png, info, palette, 1 << spec.bitDepth);
+  png_byte opaqueAfterFirst[1] = {0};  // palette entry 0 transparent
+  png_color_16 key{};                  // the colour of pixel (0, 0) transparent
+  key.gray = static_cast<png_uint_16>(sampleAt(0, 0, 0, spec.bitDepth));
+  key.red = key.gray;
+  key.green = static_cast<png_uint_16>(sampleAt(0, 0, 1, spec.bitDepth));
+  key.blue = static_cast<png_uint_16>(sampleAt(0, 0, 2, spec.bitDepth));
+  if (spec.transparentKey) png_set_tRNS(png, info, opaqueAfterFirst, 1, &key);
+  png_set_pHYs(png, info, 11811, 11811, PNG_RESOLUTION_METER);  // 300 dpi
+  png_write_info(png, info);
+  if (spec.bitDepth < 8) png_set_packing(png);  // rows below hold a sample per byte
+  int channels = channelsOf(spec.colorType);
+  int bytesPerSample = spec.bitDepth == 16 ? 2 : 1;
+  std::vector<std::vector<png_byte>> rows(kHeight);
+  std::vector<png_bytep> pointers;
+  for (int y = 0; y < kHeight; ++y) {
+    for (int x = 0; x < kWidth; ++x) {
+      for (int c = 0; c < channels; ++c) {
+        int sample = sampleAt(x, y, c, spec.bitDepth);
+        if (bytesPerSample == 2) rows[y].push_back(static_cast<png_byte>(sample >> 8));
+        rows[y].push_back(static_cast<png_byte>(sample & 0xff));
+      }
+    }
+    pointers.push_back(rows[y].data());
+  }
+  png_write_image(png, pointers.data());
+  png_write_end(png, info);
+  png_destroy_write_struct(&png, &info);
+  return out;
+}
+
+// The RGBA the reader must produce at (x, y).
+std::array<int, 4> expectedAt(const Spec& spec, int x, int y) {
+  auto s = [&](int c) { return sampleAt(x, y, c, spec.bitDepth); };
+  // The key makes every pixel of the colour of (0, 0) transparent.
+  auto first = [&](int c) { return sampleAt(0, 0, c, spec.bitDepth); };
+  bool keyed = spec.transparentKey && s(0) == first(0) &&
+               (spec.colorType == PNG_COLOR_TYPE_GRAY || (s(1) == first(1) && s(2) == first(2)));
+  switch (spec.colorType) {
+    case PNG_COLOR_TYPE_PALETTE: {
+      png_color entry = paletteEntry(s(0));
+      return {entry.red, entry.green, entry.blue, spec.transparentKey && s(0) == 0 ? 0 : 255};
+    }
+    case PNG_COLOR_TYPE_GRAY: {
+      int grey = toEight(s(0), spec.bitDepth);
+      return {grey, grey, grey, keyed ? 0 : 255};
+    }
+    case PNG_COLOR_TYPE_GRAY_ALPHA: {
+      int grey = toEight(s(0), spec.bitDepth);
+      return {grey, grey, grey, toEight(s(1), spec.bitDepth)};
+    }
+    case PNG_COLOR_TYPE_RGB:
+      return {toEight(s(0), spec.bitDepth), toEight(s(1), spec.bitDepth),
+              toEight(s(2), spec.bitDepth), keyed ? 0 : 255};
+    default:
+      return {toEight(s(0), spec.bitDepth), toEight(s(1), spec.bitDepth),
+              toEight(s(2), spec.bitDepth), toEight(s(3), spec.bitDepth)};
+  }
+}
+
+TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
+  const Spec specs[] = {
+      {"grey 1", PNG_COLOR_TYPE_GRAY, 1},
+      {"grey 1 interlaced", PNG_COLOR_TYPE_GRAY, 1, true},
+      {"grey 1 keyed", PNG_COLOR_TYPE_GRAY, 1, false, true},
+      {"grey 2", PNG_COLOR_TYPE_GRAY, 2},
+      {"grey 4 interlaced", PNG_COLOR_TYPE_GRAY, 4, true},
+      {"grey 8", PNG_COLOR_TYPE_GRAY, 8},
+      {"grey 8 interlaced", PNG_COLOR_TYPE_GRAY, 8, true},
+      {"grey 8 keyed", PNG_COLOR_TYPE_GRAY, 8, false, true},
+      {"grey 16", PNG_COLOR_TYPE_GRAY, 16},
+      {"grey+alpha 8", PNG_COLOR_TYPE_GRAY_ALPHA, 8},
+      {"grey+alpha 16 interlaced", PNG_COLOR_TYPE_GRAY_ALPHA, 16, true},
+      {"rgb 8", PNG_COLOR_TYPE_RGB, 8},
+      {"rgb 8 interlaced keyed", PNG_COLOR_TYPE_RGB, 8, true, true},
+      {"rgb 16", PNG_COLOR_TYPE_RGB, 16},
+      {"rgba 8", PNG_COLOR_TYPE_RGB_ALPHA, 8},
+      {"rgba 16 interlaced", PNG_COLOR_TYPE_RGB_ALPHA, 16, true},
+      {"palette 2", PNG_COLOR_TYPE_PALETTE, 2},
+      {"palette 4 interlaced", PNG_COLOR_TYPE_PALETTE, 4, true},
+      {"palette 8 with a transparent entry", PNG_COLOR_TYPE_PALETTE, 8, false, true},
+  };
+  for (const auto& spec : specs) {
+    SCOPED_TRACE(spec.name);
+    Data png = writePng(spec);
+    ASSERT_FALSE(png.empty());
+    auto image = Image::initWithData(png);
+    ASSERT_TRUE(image);
+    auto bitmap = image->bitmap();
+    ASSERT_EQ(bitmap->width(), static_cast<std::uint32_t>(kWidth));
+    ASSERT_EQ(bitmap->height(), static_cast<std::uint32_t>(kHeight));
+    Data rgba = bitmap->rgba();
+    int wrong = 0;
+    for (int y = 0; y < kHeight; ++y) {
+      for (int x = 0; x < kWidth; ++x) {
+        const std::uint8_t* got = &rgba[static_cast<std::size_t>(y * kWidth + x) * 4];
+        auto want = expectedAt(spec, x, y);
+        if (std::equal(want.begin(), want.end(), got, [](int w, std::uint8_t g) { return w == g; }))
+          continue;
+        if (++wrong <= 3) {
+          ADD_FAILURE() << "(" << x << ", " << y << "): got " << int(got[0]) << " " << int(got[1])
+                        << " " << int(got[2]) << " " << int(got[3]) << ", want " << want[0] << " "
+                        << want[1] << " " << want[2] << " " << want[3];
+        }
+      }
+    }
+  }
+}
+
+TEST(ImagePNG, DamagedDataIsRefusedWithLibpngsReason) {
+  Data png = writePng({"grey 8", PNG_COLOR_TYPE_GRAY, 8});
+  ASSERT_FALSE(png.empty());
+  // The image data: its length precedes its type, its checksum follows it.
+  auto type = std::search(png.begin(), png.end(), std::begin("IDAT"), std::end("IDAT") - 1);
+  ASSERT_NE(type, png.end());
+  std::size_t data = static_cast<std::size_t>(type - png.begin()) + 4;
+  std::size_t length = (std::size_t{type[-2]} << 8) | type[-1];
+  Data damaged = png, badChecksum = png;
+  damaged[data + 2] ^= 0xff;               // inside the compressed pixels
+  badChecksum[data + length + 1] ^= 0xff;  // the pixels intact, their checksum wrong
+  Data cut(png.begin(), png.begin() + static_cast<long>(data + length / 2));
+  struct Case {
+    const char* name;
+    const Data& bytes;
+  } cases[] = {{"damaged", damaged}, {"bad checksum", badChecksum}, {"cut", cut}};
+  for (const auto& c : cases) {
+    testing::internal::CaptureStderr();
+    auto image = Image::initWithData(c.bytes);
+    EXPECT_EQ(testing::internal::GetCapturedStderr(), "") << c.name;  // libpng printed nothing
+    EXPECT_FALSE(image) << c.name;
+  }
+}
+
+}  // namespace
+}  // namespace corvel
