@@ -114,11 +114,22 @@ bool ImageRequestHandler::performRequests(
   std::optional<Error> firstFailure;
   std::shared_ptr<Bitmap> bitmap = bitmap_;
   std::string unreadable = "no image was given";
+  auto recognizer = PlatformRegistry::textRecognizer();
   if (!bitmap && image_) {
-    bitmap = image_->bitmap();
+    // The largest size any of the requests can use, so that a large picture is reduced
+    // while it is decoded rather than decoded whole and then reduced.
+    std::uint32_t longSide = 0;
+    for (const auto& request : requests) {
+      std::uint32_t useful = request && recognizer ? recognizer->maxUsefulLongSide(*request) : 0;
+      if (useful == 0) {
+        longSide = 0;
+        break;
+      }
+      longSide = std::max(longSide, useful);
+    }
+    bitmap = image_->bitmapFittingLongSide(longSide);
     if (!bitmap) unreadable = image_->failureReason();
   }
-  auto recognizer = PlatformRegistry::textRecognizer();
   for (const auto& request : requests) {
     if (!request) continue;
     Error failure;

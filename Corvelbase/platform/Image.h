@@ -8,6 +8,7 @@
 // lock, so an image may be shared between threads.
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <mutex>
@@ -71,6 +72,12 @@ class CORVEL_EXPORT Image {
   // The decoded pixels (decoding on the first call), or nullptr when the image cannot be
   // decoded; failureReason() then says why.
   std::shared_ptr<Bitmap> bitmap() const;
+  // The pixels reduced so that the long side is at most `maxLongSide` (by area means, the
+  // resolution reduced alike), for a reader that needs no more; the full bitmap when it
+  // fits or `maxLongSide` is 0. An image that references a file and has not been decoded
+  // yet is reduced while it is decoded (a PNG a row at a time, without ever holding the
+  // full-size pixels), and nothing is kept. nullptr when the image cannot be decoded.
+  std::shared_ptr<Bitmap> bitmapFittingLongSide(std::uint32_t maxLongSide) const;
   // Empty while decoding has not failed.
   std::string failureReason() const;
   // Pixel size; the zero size when the image cannot be decoded.
@@ -91,6 +98,9 @@ class CORVEL_EXPORT Image {
   std::string path_;         // file to decode lazily, when not empty
   std::string sourceError_;  // a failure known before decoding (an unsupported URL)
   mutable std::once_flag decodeOnce_;
+  mutable std::atomic<bool> decoded_{false};
+  mutable std::mutex knownSizeMutex_;
+  mutable std::optional<Size> knownSize_;  // from a reduced decoding
   mutable std::shared_ptr<Bitmap> bitmap_;
   mutable std::string failure_;
 };

@@ -126,6 +126,12 @@ class CORVEL_EXPORT TextRecognizer {
   // nullopt and *error (never null) set, in TextRecognitionErrorDomain.
   virtual std::optional<std::vector<RecognizedTextObservation>> recognize(
       const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) = 0;
+  // The longest side in pixels an image needs for `request`, or 0 for its full size. A
+  // handler then gives `recognize` an image reduced to that, and a file-backed image is
+  // reduced while it is decoded.
+  virtual std::uint32_t maxUsefulLongSide(const TextRecognitionRequest& /*request*/) const {
+    return 0;
+  }
   // The language codes supported at `level`, in the recogniser's own order; nullopt
   // and *error (never null) when it cannot say.
   virtual std::optional<std::vector<std::string>> supportedRecognitionLanguages(
@@ -209,6 +215,8 @@ class CORVEL_EXPORT TesseractRecognizer final : public TextRecognizer {
   bool isAvailable() const override;
   std::optional<std::vector<RecognizedTextObservation>> recognize(
       const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) override;
+  // `fastMaxLongSide` for the fast level; accurate reads at full resolution.
+  std::uint32_t maxUsefulLongSide(const TextRecognitionRequest& request) const override;
   std::optional<std::vector<std::string>> supportedRecognitionLanguages(std::int64_t level,
                                                                         std::int64_t revision,
                                                                         Error* error) override;

@@ -3,6 +3,9 @@
 
 #include <leptonica/allheaders.h>
 
+#include <optional>
+#include <vector>
+
 #include "Corvelbase/platform/Image.h"
 
 namespace corvel {
@@ -24,7 +27,53 @@ struct Bitmap::Native {
 std::shared_ptr<Bitmap> bitmapFromPix(PIX* pix, std::string* failure);
 
 // Decodes a PNG file's bytes; nullptr with *failure saying why when they are not one
-// whole PNG image within the pixel budget.
-PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::string* failure);
+// whole PNG image within the pixel budget. With a `maxLongSide` the image is reduced
+// to fit while it is decoded, where its layout allows (not interlaced); the result may
+// then still be larger, and the caller reduces it with reducePix.
+PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
+               std::string* failure);
+
+// Asks the kernel for huge pages over the whole 2 MiB blocks of a fresh picture buffer
+// before it is first written.
+void adviseHugePages(void* buffer, std::size_t size);
+
+// The size a picture is reduced to so that its long side is at most `maxLongSide`;
+// nullopt when it already fits (or nothing is asked).
+struct ReducedSize {
+  std::uint32_t width, height;
+  double scale;
+};
+std::optional<ReducedSize> reducedSizeFor(std::uint32_t width, std::uint32_t height,
+                                          std::uint32_t maxLongSide);
+
+// A new 8-bit (1 channel) or 32-bit (4 channels) picture of a reduced size, its
+// resolution reduced alike.
+PIX* createReduced(ReducedSize size, int channels, int xResolution, int yResolution);
+
+// Reduces rows given top to bottom into `out` (made by createReduced): every target pixel
+// is the rounded mean of the block of whole source pixels that falls in it. Rows are in
+// PNG's byte order: a byte per pixel for 1 channel, R, G, B, A for 4.
+class RowReducer {
+ public:
+  RowReducer(std::uint32_t width, std::uint32_t height, ReducedSize size, int channels, PIX* out);
+  void addRow(const std::uint8_t* row);
+
+ private:
+  void flush();
+
+  std::uint32_t width_, height_;
+  ReducedSize size_;
+  int channels_;
+  PIX* out_;
+  std::vector<std::uint32_t> firstColumn_;  // of each target column, and the width at the end
+  std::vector<double> columnReciprocal_;    // 1 / source columns of each target column
+  std::vector<std::uint32_t> columnSums_;   // of the rows of the current target row
+  std::uint32_t nextRow_ = 0, currentTarget_ = 0, rowsInTarget_ = 0;
+};
+
+// `pix` (1, 8 or 32 bits) reduced so that its long side is at most `maxLongSide`, in the
+// same way as while decoding; nullptr when it already fits or cannot be reduced. Bilevel
+// pictures become grey.
+PIX* reducePix(PIX* pix, std::uint32_t maxLongSide);
 
 }  // namespace corvel

@@ -40,7 +40,10 @@ std::string formatName(l_int32 format) {
   }
 }
 
-std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure) {
+// The bitmap of encoded bytes; with a `maxLongSide`, reduced to fit (a PNG while it is
+// decoded, anything else afterwards).
+std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure,
+                                    std::uint32_t maxLongSide = 0, Size* fullSize = nullptr) {
   quietLeptonica();
   l_int32 format = IFF_UNKNOWN;
   if (bytes.size() < 12 || findFileFormatBuffer(bytes.data(), &format) != 0 ||
@@ -64,14 +67,18 @@ std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure) {
                " pixels; at most " + std::to_string(kMaxImagePixels / 1'000'000) + " megapixels)";
     return nullptr;
   }
-  if (format == IFF_PNG)
-    return bitmapFromPix(decodePNG(bytes.data(), bytes.size(), failure), failure);
-  PIX* pix = pixReadMem(bytes.data(), bytes.size());
+  PIX* pix = format == IFF_PNG ? decodePNG(bytes.data(), bytes.size(), maxLongSide, failure)
+                               : pixReadMem(bytes.data(), bytes.size());
   if (!pix) {
-    *failure = "the " + formatName(format) + " image is corrupt or truncated";
+    if (format != IFF_PNG)
+      *failure = "the " + formatName(format) + " image is corrupt or truncated";
     return nullptr;
   }
-  return bitmapFromPix(pix, failure);
+  if (fullSize) *fullSize = Size{static_cast<double>(width), static_cast<double>(height)};
+  // Reduced once the pixels are normal: colour maps and 16-bit samples are gone by then.
+  auto bitmap = bitmapFromPix(pix, failure);
+  PIX* reduced = bitmap ? reducePix(bitmap->native().pix, maxLongSide) : nullptr;
+  return reduced ? bitmapFromPix(reduced, failure) : bitmap;
 }
 
 std::string decodePercentEscapes(std::string_view text) {
@@ -285,11 +292,33 @@ void Image::decode() const {
     bitmap_ = decodeBytes(*bytes, &failure_);
     if (!bitmap_) failure_ = "\"" + path_ + "\": " + failure_;
   });
+  decoded_.store(true, std::memory_order_release);
 }
 
 std::shared_ptr<Bitmap> Image::bitmap() const {
   decode();
   return bitmap_;
+}
+
+std::shared_ptr<Bitmap> Image::bitmapFittingLongSide(std::uint32_t maxLongSide) const {
+  if (maxLongSide == 0 || decoded_.load(std::memory_order_acquire) || path_.empty()) {
+    auto full = bitmap();
+    if (!full || maxLongSide == 0) return full;
+    PIX* reduced = reducePix(full->native().pix, maxLongSide);
+    return reduced ? bitmapFromPix(reduced, nullptr) : full;
+  }
+  // Not decoded yet: decode reduced, and keep nothing, so that the full-size pixels are
+  // never held. A failure is left for bitmap() and failureReason() to find and keep.
+  auto bytes = readFile(path_);
+  std::string failure;
+  Size fullSize;
+  auto reduced = bytes ? decodeBytes(*bytes, &failure, maxLongSide, &fullSize) : nullptr;
+  if (reduced) {
+    // The full size is known now; size() need not decode the whole picture to tell.
+    std::lock_guard lock(knownSizeMutex_);
+    knownSize_ = fullSize;
+  }
+  return reduced;
 }
 
 std::string Image::failureReason() const {
@@ -298,6 +327,10 @@ std::string Image::failureReason() const {
 }
 
 Size Image::size() const {
+  {
+    std::lock_guard lock(knownSizeMutex_);
+    if (knownSize_) return *knownSize_;
+  }
   auto b = bitmap();
   return b ? Size{static_cast<double>(b->width()), static_cast<double>(b->height())} : Size{};
 }

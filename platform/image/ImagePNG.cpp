@@ -6,9 +6,12 @@
 #include <png.h>
 
 #include <csetjmp>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <optional>
+#include <vector>
 
 #include "platform/image/BitmapNative.h"
 
@@ -16,13 +19,24 @@ namespace corvel {
 
 namespace {
 
+// What the two decoding phases share. Plain data only: libpng's errors longjmp out of
+// the phases, past anything they hold.
 struct Reader {
   const std::uint8_t* bytes;
   std::size_t size;
   std::size_t offset;
   char message[160];  // libpng's reason when it gives up
-  PIX* pix;           // the bitmap being filled; freed by the caller on failure
-  png_bytep* rows;    // row pointers for interlaced images, freed by the caller
+  // Found by readHeader.
+  png_uint_32 width, height;
+  int depth;   // of the decoded picture: 1, 8 or 32
+  bool alpha;  // 32 bits: R, G, B, A rather than R, G, B and filler
+  int passes;  // 1, or 7 for an interlaced image
+  l_int32 xResolution, yResolution;
+  // Filled by readRows: either every row of `pix`, or `reducer` a row at a time from `row`.
+  PIX* pix;
+  RowReducer* reducer;
+  png_bytep row;
+  png_bytep* rows;  // row pointers into `pix` for interlaced images
 };
 
 void readBytes(png_structp png, png_bytep out, png_size_t length) {
@@ -40,25 +54,29 @@ void readBytes(png_structp png, png_bytep out, png_size_t length) {
 
 void ignoreWarning(png_structp, png_const_charp) {}
 
-// Decodes into reader->pix: 1 bit for black-and-white images (1 is black, as in all our
-// bitmaps), 8 bits for grey, 32 bits otherwise (samples per pixel 4 with alpha, else 3).
-// Keeps to plain data between setjmp and longjmp; false with reader->message on failure.
-bool decode(png_structp png, png_infop info, Reader* reader) {
+// Reads the header and sets up libpng to deliver rows of 1 bit for black-and-white
+// images, 8 bits for grey, 4 bytes otherwise; when `reduce`, bilevel rows come as grey
+// too. False with reader->message on failure.
+bool readHeader(png_structp png, png_infop info, bool reduce, std::uint32_t maxLongSide,
+                Reader* reader) {
   if (setjmp(png_jmpbuf(png))) return false;
   png_set_read_fn(png, reader, readBytes);
   // Chunk CRCs still catch damaged data; the Adler-32 sum over the inflated pixels
   // repeats that check at a tenth of the decoding time.
   png_set_option(png, PNG_IGNORE_ADLER32, PNG_OPTION_ON);
   png_read_info(png, info);
-  png_uint_32 width = png_get_image_width(png, info);
-  png_uint_32 height = png_get_image_height(png, info);
-  if (width == 0 || height == 0 || static_cast<std::uint64_t>(width) * height > kMaxImagePixels) {
+  reader->width = png_get_image_width(png, info);
+  reader->height = png_get_image_height(png, info);
+  if (reader->width == 0 || reader->height == 0 ||
+      static_cast<std::uint64_t>(reader->width) * reader->height > kMaxImagePixels) {
     png_error(png, "the image's size is out of range");
   }
   int colorType = png_get_color_type(png, info);
   int bitDepth = png_get_bit_depth(png, info);
   bool transparency = png_get_valid(png, info, PNG_INFO_tRNS) != 0;
-  bool bilevel = colorType == PNG_COLOR_TYPE_GRAY && bitDepth == 1 && !transparency;
+  reduce = reduce && png_get_interlace_type(png, info) == PNG_INTERLACE_NONE &&
+           reducedSizeFor(reader->width, reader->height, maxLongSide);
+  bool bilevel = !reduce && colorType == PNG_COLOR_TYPE_GRAY && bitDepth == 1 && !transparency;
   if (bitDepth == 16) png_set_strip_16(png);  // the high byte, as Leptonica keeps it
   if (colorType == PNG_COLOR_TYPE_PALETTE) png_set_palette_to_rgb(png);
   if (colorType == PNG_COLOR_TYPE_GRAY && bitDepth < 8 && !bilevel) {
@@ -66,48 +84,81 @@ bool decode(png_structp png, png_infop info, Reader* reader) {
   }
   if (transparency) png_set_tRNS_to_alpha(png);
   bool grey = colorType == PNG_COLOR_TYPE_GRAY && !transparency;
-  bool alpha = (colorType & PNG_COLOR_MASK_ALPHA) != 0 || transparency;
+  reader->alpha = (colorType & PNG_COLOR_MASK_ALPHA) != 0 || transparency;
   if (!grey && (colorType & PNG_COLOR_MASK_COLOR) == 0) png_set_gray_to_rgb(png);
-  if (!grey && !alpha) png_set_filler(png, 0xff, PNG_FILLER_AFTER);
-  int passes = png_set_interlace_handling(png);
+  if (!grey && !reader->alpha) png_set_filler(png, 0xff, PNG_FILLER_AFTER);
+  reader->passes = png_set_interlace_handling(png);
   png_read_update_info(png, info);
-
-  reader->pix = pixCreateNoInit(static_cast<l_int32>(width), static_cast<l_int32>(height),
-                                bilevel ? 1
-                                : grey  ? 8
-                                        : 32);
-  if (!reader->pix) png_error(png, "there is not enough memory for the image");
-  if (!grey) pixSetSpp(reader->pix, alpha ? 4 : 3);
-  auto* data = reinterpret_cast<png_bytep>(pixGetData(reader->pix));
-  std::size_t stride = static_cast<std::size_t>(pixGetWpl(reader->pix)) * 4;
-  if (png_get_rowbytes(png, info) > stride) png_error(png, "unexpected row size");
-  if (passes > 1) {
-    // Interlaced passes fill in each row several times, so every row must be at hand.
-    reader->rows = static_cast<png_bytep*>(std::malloc(height * sizeof(png_bytep)));
-    if (!reader->rows) png_error(png, "there is not enough memory for the image");
-    for (png_uint_32 y = 0; y < height; ++y) reader->rows[y] = data + y * stride;
-    png_read_image(png, reader->rows);
-  } else {
-    for (png_uint_32 y = 0; y < height; ++y) png_read_row(png, data + y * stride, nullptr);
-  }
-  // Whatever follows the pixels (text, time, the end marker) is not needed: the image
-  // data's checksums have been compared by now.
+  reader->depth = bilevel ? 1 : grey ? 8 : 32;
   png_uint_32 xPerMetre = 0, yPerMetre = 0;
   int unit = 0;
   if (png_get_pHYs(png, info, &xPerMetre, &yPerMetre, &unit) && unit == PNG_RESOLUTION_METER) {
-    pixSetResolution(reader->pix, static_cast<l_int32>(xPerMetre / 39.37 + 0.5),
-                     static_cast<l_int32>(yPerMetre / 39.37 + 0.5));
+    reader->xResolution = static_cast<l_int32>(xPerMetre / 39.37 + 0.5);
+    reader->yResolution = static_cast<l_int32>(yPerMetre / 39.37 + 0.5);
+  }
+  return true;
+}
+
+// Decodes every row into reader->pix, or through reader->reducer. Whatever follows the
+// pixels (text, time, the end marker) is not needed: the image data's checksums have
+// been compared by the time the last row is out. False with reader->message on failure.
+bool readRows(png_structp png, png_infop info, Reader* reader) {
+  if (setjmp(png_jmpbuf(png))) return false;
+  if (reader->reducer) {
+    for (png_uint_32 y = 0; y < reader->height; ++y) {
+      png_read_row(png, reader->row, nullptr);
+      reader->reducer->addRow(reader->row);
+    }
+    return true;
+  }
+  auto* data = reinterpret_cast<png_bytep>(pixGetData(reader->pix));
+  std::size_t stride = static_cast<std::size_t>(pixGetWpl(reader->pix)) * 4;
+  if (png_get_rowbytes(png, info) > stride) png_error(png, "unexpected row size");
+  adviseHugePages(data, stride * reader->height);
+  if (reader->passes > 1) {
+    // Interlaced passes fill in each row several times, so every row must be at hand.
+    reader->rows = static_cast<png_bytep*>(std::malloc(reader->height * sizeof(png_bytep)));
+    if (!reader->rows) png_error(png, "there is not enough memory for the image");
+    for (png_uint_32 y = 0; y < reader->height; ++y) reader->rows[y] = data + y * stride;
+    png_read_image(png, reader->rows);
+  } else {
+    for (png_uint_32 y = 0; y < reader->height; ++y) png_read_row(png, data + y * stride, nullptr);
   }
   return true;
 }
 
 }  // namespace
 
-PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::string* failure) {
-  Reader reader{bytes, size, 0, {}, nullptr, nullptr};
+PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
+               std::string* failure) {
+  Reader reader{};
+  reader.bytes = bytes;
+  reader.size = size;
   png_structp png = png_create_read_struct(PNG_LIBPNG_VER_STRING, &reader, fail, ignoreWarning);
   png_infop info = png ? png_create_info_struct(png) : nullptr;
-  bool decoded = info && decode(png, info, &reader);
+  std::optional<RowReducer> reducer;
+  std::vector<std::uint8_t> row;
+  bool decoded = info && readHeader(png, info, maxLongSide > 0, maxLongSide, &reader);
+  if (decoded) {
+    auto reduced = reader.passes == 1 && reader.depth != 1
+                       ? reducedSizeFor(reader.width, reader.height, maxLongSide)
+                       : std::nullopt;
+    int channels = reader.depth == 32 ? 4 : 1;
+    reader.pix = reduced ? createReduced(*reduced, channels, reader.xResolution, reader.yResolution)
+                         : pixCreateNoInit(static_cast<l_int32>(reader.width),
+                                           static_cast<l_int32>(reader.height), reader.depth);
+    if (reader.pix && reduced) {
+      reducer.emplace(reader.width, reader.height, *reduced, channels, reader.pix);
+      reader.reducer = &*reducer;
+      row.resize(png_get_rowbytes(png, info));
+      reader.row = row.data();
+    } else if (reader.pix) {
+      pixSetResolution(reader.pix, reader.xResolution, reader.yResolution);
+    }
+    if (reader.pix && reader.depth == 32) pixSetSpp(reader.pix, reader.alpha ? 4 : 3);
+    decoded = reader.pix && readRows(png, info, &reader);
+    if (!reader.pix) std::snprintf(reader.message, sizeof reader.message, "out of memory");
+  }
   png_destroy_read_struct(&png, info ? &info : nullptr, nullptr);
   std::free(reader.rows);
   if (!decoded) {
@@ -116,11 +167,12 @@ PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::string* failure
     if (reader.message[0]) *failure += std::string(" (") + reader.message + ")";
     return nullptr;
   }
+  if (reader.reducer) return reader.pix;  // written in Leptonica's order already
   // PNG stores pixels in reading order, a byte at a time; Leptonica keeps them in 32-bit
   // words with the first pixel in the high byte, and counts 1 as black where PNG counts
   // 1 as white.
   pixEndianByteSwap(reader.pix);
-  if (pixGetDepth(reader.pix) == 1) pixInvert(reader.pix, reader.pix);
+  if (reader.depth == 1) pixInvert(reader.pix, reader.pix);
   return reader.pix;
 }
 

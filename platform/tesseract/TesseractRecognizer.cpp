@@ -162,17 +162,16 @@ Page preparePage(const Bitmap& bitmap) {
   return page;
 }
 
-// Scales the page so that its long side is at most `maxLongSide`; false when that fails.
+// Reduces the page so that its long side is at most `maxLongSide`; false when that
+// fails. A page from a handler usually fits already: the image was reduced in the same
+// way while it was decoded.
 bool capLongSide(Page& page, std::uint32_t maxLongSide) {
   int longSide = std::max(pixGetWidth(page.pix), pixGetHeight(page.pix));
   if (maxLongSide == 0 || longSide <= static_cast<int>(maxLongSide)) return true;
   float scale = static_cast<float>(maxLongSide) / static_cast<float>(longSide);
-  // Each new pixel is the mean of the block of old ones around it: as sharp as the
-  // engine needs, in a quarter of the time of exact area mapping.
-  PIX* scaled = pixGetDepth(page.pix) == 1 ? pixScaleToGray(page.pix, scale)
-                                           : pixScaleSmooth(page.pix, scale, scale);
-  if (!scaled) return false;
-  page.replace(scaled);
+  PIX* reduced = reducePix(page.pix, maxLongSide);
+  if (!reduced) return false;
+  page.replace(reduced);
   page.resolution = std::max(1, static_cast<int>(static_cast<float>(page.resolution) * scale));
   return true;
 }
@@ -226,10 +225,11 @@ struct TesseractRecognizer::Impl {
     }
   }
 
-  // Runs `work` on an engine for `key` inside the gate; false with *error when no
-  // engine can start.
-  template <typename Work>
-  bool withEngine(const EngineKey& key, Error* error, Work work) {
+  // Runs `recognise` and then `collect` on an engine for `key` inside the gate; false
+  // with *error when no engine can start. Only `recognise` and the engine's clean-up
+  // count as the engine's time: reading its results into ours is our own work.
+  template <typename Recognise, typename Collect>
+  bool withEngine(const EngineKey& key, Error* error, Recognise recognise, Collect collect) {
     // Engines are taken inside the gate, so no more of them run (or start) than there
     // are cores, and the pool never holds more engines per key than that.
     gate.enter();
@@ -243,15 +243,19 @@ struct TesseractRecognizer::Impl {
       *error = makeTextRecognitionError(TextRecognitionErrorEngineFailure, failure);
       return false;
     }
-    auto started = std::chrono::steady_clock::now();
+    auto clock = std::chrono::steady_clock::now();
     cpuStarted = threadCpuSeconds();
-    work(engine->api);
-    // An idle engine keeps no page: its copy and results go with the job. The engine's
-    // own clean-up, so it counts with its work.
-    engine->api.Clear();
+    bool recognised = recognise(engine->api);
     double cpuSeconds = threadCpuSeconds() - cpuStarted;
     double seconds =
-        std::chrono::duration<double>(std::chrono::steady_clock::now() - started).count();
+        std::chrono::duration<double>(std::chrono::steady_clock::now() - clock).count();
+    if (recognised) collect(engine->api);
+    // An idle engine keeps no page: its copy and results go with the job.
+    clock = std::chrono::steady_clock::now();
+    cpuStarted = threadCpuSeconds();
+    engine->api.Clear();
+    cpuSeconds += threadCpuSeconds() - cpuStarted;
+    seconds += std::chrono::duration<double>(std::chrono::steady_clock::now() - clock).count();
     pool.release(std::move(engine));
     gate.leave();
     record(seconds, cpuSeconds, startSeconds, startCpuSeconds, startSeconds > 0);
@@ -268,24 +272,26 @@ struct TesseractRecognizer::Impl {
   Orientation detectOrientation(const Page& page, Error* error) {
     Orientation result;
     if (!isInstalled(kOrientationModel)) return result;
-    withEngine({kOrientationModel, true}, error, [&](tesseract::TessBaseAPI& api) {
+    int degrees = 0;
+    float orientationConfidence = 0, scriptConfidence = 0;
+    const char* script = nullptr;
+    auto detect = [&](tesseract::TessBaseAPI& api) {
       api.SetPageSegMode(tesseract::PSM_OSD_ONLY);
       api.SetImage(page.pix);
       api.SetSourceResolution(page.resolution);
-      int degrees = 0;
-      float orientationConfidence = 0, scriptConfidence = 0;
-      const char* script = nullptr;
-      if (!api.DetectOrientationScript(&degrees, &orientationConfidence, &script,
-                                       &scriptConfidence)) {
-        return;
-      }
+      return api.DetectOrientationScript(&degrees, &orientationConfidence, &script,
+                                         &scriptConfidence);
+    };
+    auto collect = [&](tesseract::TessBaseAPI&) {
       // `degrees` is how far the page's text is turned clockwise from upright; turning
       // the page clockwise by the rest of a full turn makes it upright.
       if (orientationConfidence >= kMinOrientationConfidence && degrees % 90 == 0) {
         result.rotateQuadrants = ((360 - degrees) / 90) % 4;
       }
+      // The engine owns the script's name.
       if (script && scriptConfidence >= kMinScriptConfidence) result.script = script;
-    });
+    };
+    withEngine({kOrientationModel, true}, error, detect, collect);
     return result;
   }
 
@@ -294,7 +300,7 @@ struct TesseractRecognizer::Impl {
                      Error* error) {
     EngineKey key{models, request.usesLanguageCorrection()};
     bool recognised = false;
-    bool started = withEngine(key, error, [&](tesseract::TessBaseAPI& api) {
+    auto recognise = [&](tesseract::TessBaseAPI& api) {
       // Only the automatic segmentation keeps the columns of a page apart.
       api.SetPageSegMode(tesseract::PSM_AUTO);
       // Sauvola's adaptive threshold keeps the text of unevenly lit pages.
@@ -303,10 +309,11 @@ struct TesseractRecognizer::Impl {
       api.SetVariable("tessedit_do_invert", fast ? "0" : "1");
       api.SetImage(page.pix);
       api.SetSourceResolution(page.resolution);
-      if (api.Recognize(nullptr) != 0) return;
-      recognised = true;
-      collectLines(api, page.pix, out);
-    });
+      recognised = api.Recognize(nullptr) == 0;
+      return recognised;
+    };
+    auto collect = [&](tesseract::TessBaseAPI& api) { collectLines(api, page.pix, out); };
+    bool started = withEngine(key, error, recognise, collect);
     if (started && !recognised) {
       *error = makeTextRecognitionError(TextRecognitionErrorEngineFailure,
                                         "the recognition engine failed on the image");
@@ -315,12 +322,17 @@ struct TesseractRecognizer::Impl {
   }
 
   static void collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult* out) {
-    std::unique_ptr<tesseract::ResultIterator> it(api.GetIterator());
-    if (!it) return;
+    std::unique_ptr<tesseract::ResultIterator> results(api.GetIterator());
+    if (!results) return;
+    // The result iterator's own stepping and text put words in right-to-left reading
+    // order where a line needs it, and to find out it walks the page from its start for
+    // every line: a hundred times the cost of the rest. Every language we read runs left
+    // to right, so lines are read through the left-to-right iterator it is built on.
+    tesseract::LTRResultIterator* it = results.get();
     double width = pixGetWidth(page), height = pixGetHeight(page);
     do {
       if (it->Empty(tesseract::RIL_TEXTLINE)) continue;
-      std::unique_ptr<char[]> raw(it->GetUTF8Text(tesseract::RIL_TEXTLINE));
+      std::unique_ptr<char[]> raw(it->LTRResultIterator::GetUTF8Text(tesseract::RIL_TEXTLINE));
       std::string text = trimmed(raw.get());
       int left = 0, top = 0, right = 0, bottom = 0;
       if (text.empty() || !it->BoundingBox(tesseract::RIL_TEXTLINE, &left, &top, &right, &bottom)) {
@@ -331,11 +343,12 @@ struct TesseractRecognizer::Impl {
       // origin at the bottom left.
       observation.boundingBox = Rect(left / width, 1.0 - bottom / height, (right - left) / width,
                                      (bottom - top) / height);
-      float confidence = std::clamp(it->Confidence(tesseract::RIL_TEXTLINE) / 100.0f, 0.0f, 1.0f);
+      float confidence = std::clamp(
+          it->LTRResultIterator::Confidence(tesseract::RIL_TEXTLINE) / 100.0f, 0.0f, 1.0f);
       observation.candidates.push_back({fromUTF8(text), confidence});
       out->observations.push_back(std::move(observation));
       out->text += text + "\n";
-    } while (it->Next(tesseract::RIL_TEXTLINE));
+    } while (it->PageIterator::Next(tesseract::RIL_TEXTLINE));
   }
 
   // The models for the request's own codes; false with *error for a code we cannot read.
@@ -461,6 +474,11 @@ std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recog
     }
   }
   return std::move(result.observations);
+}
+
+std::uint32_t TesseractRecognizer::maxUsefulLongSide(const TextRecognitionRequest& request) const {
+  return request.recognitionLevel() == TextRecognitionLevelFast ? impl_->options.fastMaxLongSide
+                                                                : 0;
 }
 
 TesseractRecognizer::Statistics TesseractRecognizer::statistics() const {

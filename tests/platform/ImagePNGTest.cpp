@@ -1,12 +1,20 @@
 // PNG reading against images written here with libpng in every colour type, bit depth
 // and interlacing, so each transformation the reader asks libpng for is checked against
-// what the pixels are by definition.
+// what the pixels are by definition; and reduction to a smaller size, while decoding and
+// afterwards, against block means computed pixel by pixel.
 #include <gtest/gtest.h>
 #include <png.h>
 
+#include <array>
+#include <cmath>
 #include <csetjmp>
 
+#include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Image.h"
+#include "Corvelbase/platform/Platform.h"
+#include "Corvelbase/platform/TextRecognizer.h"
+#include "support/FakeRecognizer.h"
+#include "support/TestSupport.h"
 
 namespace corvel {
 namespace {
@@ -59,7 +67,7 @@ png_color paletteEntry(int i) {
           static_cast<png_byte>(i * 3)};
 }
 
-Data writePng(const Spec& spec) {
+Data writePng(const Spec& spec, int width = kWidth, int height = kHeight) {
   Data out;
   png_structp png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
   png_infop info = png_create_info_struct(png);
@@ -68,7 +76,8 @@ Data writePng(const Spec& spec) {
     return {};
   }
   png_set_write_fn(png, &out, appendBytes, nullptr);
-  png_set_IHDR(png, info, kWidth, kHeight, spec.bitDepth, spec.colorType,
+  png_set_IHDR(png, info, static_cast<png_uint_32>(width), static_cast<png_uint_32>(height),
+               spec.bitDepth, spec.colorType,
                spec.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
                PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
   png_color palette[256];
@@ -87,17 +96,18 @@ Data writePng(const Spec& spec) {
   if (spec.bitDepth < 8) png_set_packing(png);  // rows below hold a sample per byte
   int channels = channelsOf(spec.colorType);
   int bytesPerSample = spec.bitDepth == 16 ? 2 : 1;
-  std::vector<std::vector<png_byte>> rows(kHeight);
+  std::vector<std::vector<png_byte>> rows(static_cast<std::size_t>(height));
   std::vector<png_bytep> pointers;
-  for (int y = 0; y < kHeight; ++y) {
-    for (int x = 0; x < kWidth; ++x) {
+  for (int y = 0; y < height; ++y) {
+    for (int x = 0; x < width; ++x) {
       for (int c = 0; c < channels; ++c) {
         int sample = sampleAt(x, y, c, spec.bitDepth);
-        if (bytesPerSample == 2) rows[y].push_back(static_cast<png_byte>(sample >> 8));
-        rows[y].push_back(static_cast<png_byte>(sample & 0xff));
+        if (bytesPerSample == 2)
+          rows[static_cast<std::size_t>(y)].push_back(static_cast<png_byte>(sample >> 8));
+        rows[static_cast<std::size_t>(y)].push_back(static_cast<png_byte>(sample & 0xff));
       }
     }
-    pointers.push_back(rows[y].data());
+    pointers.push_back(rows[static_cast<std::size_t>(y)].data());
   }
   png_write_image(png, pointers.data());
   png_write_end(png, info);
@@ -200,11 +210,111 @@ TEST(ImagePNG, DamagedDataIsRefusedWithLibpngsReason) {
     const Data& bytes;
   } cases[] = {{"damaged", damaged}, {"bad checksum", badChecksum}, {"cut", cut}};
   for (const auto& c : cases) {
-    testing::internal::CaptureStderr();
+    ::testing::internal::CaptureStderr();
     auto image = Image::initWithData(c.bytes);
-    EXPECT_EQ(testing::internal::GetCapturedStderr(), "") << c.name;  // libpng printed nothing
+    EXPECT_EQ(::testing::internal::GetCapturedStderr(), "") << c.name;  // libpng printed nothing
     EXPECT_FALSE(image) << c.name;
   }
+}
+
+// The picture `spec` at `width` x `height` reduced to fit `maxLongSide`, computed pixel
+// by pixel: each source pixel adds to the target pixel it falls in.
+Data reducedByDefinition(const Spec& spec, int width, int height, int maxLongSide) {
+  double scale = static_cast<double>(maxLongSide) / std::max(width, height);
+  auto side = [&](int n) {
+    return std::clamp(static_cast<int>(std::floor(n * scale)), 1, maxLongSide);
+  };
+  int targetWidth = side(width), targetHeight = side(height);
+  std::vector<std::array<double, 5>> sums(static_cast<std::size_t>(targetWidth * targetHeight));
+  for (int y = 0; y < height; ++y) {
+    for (int x = 0; x < width; ++x) {
+      auto& sum = sums[static_cast<std::size_t>((y * targetHeight / height) * targetWidth +
+                                                x * targetWidth / width)];
+      auto pixel = expectedAt(spec, x, y);
+      for (int c = 0; c < 4; ++c)
+        sum[static_cast<std::size_t>(c)] += pixel[static_cast<std::size_t>(c)];
+      sum[4] += 1;
+    }
+  }
+  Data out;
+  for (const auto& sum : sums) {
+    for (int c = 0; c < 4; ++c) {
+      out.push_back(
+          static_cast<std::uint8_t>(std::floor(sum[static_cast<std::size_t>(c)] / sum[4] + 0.5)));
+    }
+  }
+  return out;
+}
+
+TEST(ImageReduce, ReducedPixelsAreTheMeansOfTheBlocksTheyCover) {
+  const Spec specs[] = {
+      {"grey 1", PNG_COLOR_TYPE_GRAY, 1},
+      {"grey 8", PNG_COLOR_TYPE_GRAY, 8},
+      {"grey 16", PNG_COLOR_TYPE_GRAY, 16},
+      {"rgb 8", PNG_COLOR_TYPE_RGB, 8},
+      {"rgba 8", PNG_COLOR_TYPE_RGB_ALPHA, 8},
+      {"grey+alpha 8", PNG_COLOR_TYPE_GRAY_ALPHA, 8},
+      {"palette 4 keyed", PNG_COLOR_TYPE_PALETTE, 4, false, true},
+      {"grey 8 interlaced", PNG_COLOR_TYPE_GRAY, 8, true},
+  };
+  struct Size3 {
+    int width, height, maxLongSide;
+  } sizes[] = {{37, 23, 10}, {23, 37, 30}, {300, 3, 100}, {9, 9, 8}};
+  testing::TempDir dir;
+  for (const auto& spec : specs) {
+    for (const auto& size : sizes) {
+      SCOPED_TRACE(std::string(spec.name) + " " + std::to_string(size.width) + "x" +
+                   std::to_string(size.height) + " to " + std::to_string(size.maxLongSide));
+      Data png = writePng(spec, size.width, size.height);
+      std::string path = dir.file("reduce.png");
+      ASSERT_TRUE(writeFileAtomically(path, png));
+      // Reduced while decoded (rows straight from the file) and after decoding whole.
+      auto referenced = Image::initByReferencingFile(path);
+      auto whileDecoding =
+          referenced->bitmapFittingLongSide(static_cast<std::uint32_t>(size.maxLongSide));
+      auto afterDecoding = Image::initWithData(png)->bitmapFittingLongSide(
+          static_cast<std::uint32_t>(size.maxLongSide));
+      ASSERT_TRUE(whileDecoding && afterDecoding);
+      Data expected = reducedByDefinition(spec, size.width, size.height, size.maxLongSide);
+      EXPECT_EQ(whileDecoding->rgba(), expected);
+      EXPECT_EQ(afterDecoding->rgba(), expected);
+      EXPECT_EQ(referenced->size(),
+                (Size{static_cast<double>(size.width), static_cast<double>(size.height)}));
+    }
+  }
+  // Pictures that fit, and no limit, come whole.
+  auto image = Image::initWithData(writePng(specs[1]));
+  EXPECT_EQ(image->bitmapFittingLongSide(kWidth), image->bitmap());
+  EXPECT_EQ(image->bitmapFittingLongSide(0), image->bitmap());
+}
+
+// A handler gives a recogniser the size it asks for: reduced for a fast request alone, whole
+// when another request on the same image needs every pixel.
+TEST(ImageReduce, HandlersReduceImagesToTheSizeTheRecogniserCanUse) {
+  auto fake = std::make_shared<testing::FakeRecognizer>();
+  fake->setFastMaxLongSide(10);
+  PlatformRegistry::setTextRecognizer(fake);
+  testing::TempDir dir;
+  std::string path = dir.file("page.png");
+  ASSERT_TRUE(writeFileAtomically(path, writePng({"grey 8", PNG_COLOR_TYPE_GRAY, 8}, 40, 20)));
+  auto request = [](std::int64_t level) {
+    auto r = TextRecognitionRequest::initWithCompletionHandler(nullptr);
+    r->setRecognitionLevel(level);
+    return r;
+  };
+  Error error;
+  ImageRequestHandler::initWithImage(Image::initByReferencingFile(path), {})
+      ->performRequests({request(TextRecognitionLevelFast)}, &error);
+  ImageRequestHandler::initWithImage(Image::initByReferencingFile(path), {})
+      ->performRequests({request(TextRecognitionLevelFast), request(TextRecognitionLevelAccurate)},
+                        &error);
+  auto seen = fake->requests();
+  PlatformRegistry::setTextRecognizer(nullptr);
+  ASSERT_EQ(seen.size(), 3u);
+  EXPECT_EQ(seen[0].width, 10u);
+  EXPECT_EQ(seen[0].height, 5u);
+  EXPECT_EQ(seen[1].width, 40u);
+  EXPECT_EQ(seen[2].width, 40u);
 }
 
 }  // namespace

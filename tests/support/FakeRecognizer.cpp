@@ -98,6 +98,16 @@ std::optional<std::vector<RecognizedTextObservation>> FakeRecognizer::recognize(
   return observations_;
 }
 
+void FakeRecognizer::setFastMaxLongSide(std::uint32_t side) {
+  std::lock_guard lock(mutex_);
+  fastMaxLongSide_ = side;
+}
+
+std::uint32_t FakeRecognizer::maxUsefulLongSide(const TextRecognitionRequest& request) const {
+  std::lock_guard lock(mutex_);
+  return request.recognitionLevel() == TextRecognitionLevelFast ? fastMaxLongSide_ : 0;
+}
+
 std::optional<std::vector<std::string>> FakeRecognizer::supportedRecognitionLanguages(
     std::int64_t level, std::int64_t revision, Error* error) {
   std::lock_guard lock(mutex_);

@@ -37,6 +37,8 @@ class FakeRecognizer final : public TextRecognizer {
   // Every recognition fails with `error` while set.
   void setFailure(std::optional<Error> error);
   void setSupportedLanguages(std::optional<std::vector<std::string>> codes, Error error = {});
+  // The long side the fake asks for fast requests (0, the default: full size).
+  void setFastMaxLongSide(std::uint32_t side);
 
   // While held, recognitions wait inside `recognize` until `release`.
   void hold();
@@ -54,6 +56,7 @@ class FakeRecognizer final : public TextRecognizer {
   bool isAvailable() const override;
   std::optional<std::vector<RecognizedTextObservation>> recognize(
       const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) override;
+  std::uint32_t maxUsefulLongSide(const TextRecognitionRequest& request) const override;
   std::optional<std::vector<std::string>> supportedRecognitionLanguages(std::int64_t level,
                                                                         std::int64_t revision,
                                                                         Error* error) override;
@@ -68,6 +71,7 @@ class FakeRecognizer final : public TextRecognizer {
   std::vector<RecognizedTextObservation> observations_;
   std::optional<Error> failure_;
   std::optional<std::vector<std::string>> supported_ = std::vector<std::string>{"en-US"};
+  std::uint32_t fastMaxLongSide_ = 0;
   Error supportedError_;
   std::vector<Recorded> requests_;
   std::vector<SupportedQuery> supportedQueries_;
