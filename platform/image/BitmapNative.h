@@ -37,6 +37,18 @@ PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLon
 // before it is first written.
 void adviseHugePages(void* buffer, std::size_t size);
 
+// A picture with uninitialised pixels (pad bits cleared) whose buffer has huge pages
+// from the start: Leptonica's own allocation writes every row's pad bits at once, so any
+// advice given after it comes too late. The buffer comes from posix_memalign, which
+// Leptonica's default deallocator (free) releases with the picture; this library never
+// installs a Leptonica pix memory manager and assumes its host does not either.
+PIX* createPagePix(std::uint32_t width, std::uint32_t height, int depth);
+
+// The same for the PNGs libdeflate can inflate whole (8-bit grey, RGB or RGBA, not
+// interlaced, no transparency key), always reduced to fit; nullptr for any other PNG and
+// for any fault, which decodePNG then reads and reports through libpng.
+PIX* decodePNGWhole(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide);
+
 // The size a picture is reduced to so that its long side is at most `maxLongSide`;
 // nullopt when it already fits (or nothing is asked).
 struct ReducedSize {
@@ -68,6 +80,8 @@ class RowReducer {
   std::vector<std::uint32_t> firstColumn_;  // of each target column, and the width at the end
   std::vector<double> columnReciprocal_;    // 1 / source columns of each target column
   std::vector<std::uint32_t> columnSums_;   // of the rows of the current target row
+  bool atMostTwoColumns_ = true;            // in every target column
+  std::vector<std::uint8_t> lineBytes_;     // a grey target row before packing
   std::uint32_t nextRow_ = 0, currentTarget_ = 0, rowsInTarget_ = 0;
 };
 

@@ -114,7 +114,6 @@ bool readRows(png_structp png, png_infop info, Reader* reader) {
   auto* data = reinterpret_cast<png_bytep>(pixGetData(reader->pix));
   std::size_t stride = static_cast<std::size_t>(pixGetWpl(reader->pix)) * 4;
   if (png_get_rowbytes(png, info) > stride) png_error(png, "unexpected row size");
-  adviseHugePages(data, stride * reader->height);
   if (reader->passes > 1) {
     // Interlaced passes fill in each row several times, so every row must be at hand.
     reader->rows = static_cast<png_bytep*>(std::malloc(reader->height * sizeof(png_bytep)));
@@ -131,6 +130,7 @@ bool readRows(png_structp png, png_infop info, Reader* reader) {
 
 PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
                std::string* failure) {
+  if (PIX* pix = decodePNGWhole(bytes, size, maxLongSide)) return pix;
   Reader reader{};
   reader.bytes = bytes;
   reader.size = size;
@@ -145,8 +145,7 @@ PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLon
                        : std::nullopt;
     int channels = reader.depth == 32 ? 4 : 1;
     reader.pix = reduced ? createReduced(*reduced, channels, reader.xResolution, reader.yResolution)
-                         : pixCreateNoInit(static_cast<l_int32>(reader.width),
-                                           static_cast<l_int32>(reader.height), reader.depth);
+                         : createPagePix(reader.width, reader.height, reader.depth);
     if (reader.pix && reduced) {
       reducer.emplace(reader.width, reader.height, *reduced, channels, reader.pix);
       reader.reducer = &*reducer;

@@ -1,25 +1,11 @@
 // Reducing pictures to a smaller size by area means, a row at a time, so that a large
 // picture can be reduced while it is decoded without ever being held at full size.
-#include <sys/mman.h>
-
 #include <algorithm>
 #include <cmath>
 
 #include "platform/image/BitmapNative.h"
 
 namespace corvel {
-
-// A scanned page is several megabytes of fresh memory, and the first write to each 4 KiB
-// page of it costs a fault into the kernel: on a virtual machine that is as much time as
-// decoding the page. Asking for huge pages over the part of the buffer that spans whole
-// 2 MiB blocks makes that a handful of faults. Only advice: where the kernel offers no
-// huge pages it changes nothing.
-void adviseHugePages(void* buffer, std::size_t size) {
-  constexpr std::uintptr_t kHugePage = std::uintptr_t{2} << 20;
-  auto begin = (reinterpret_cast<std::uintptr_t>(buffer) + kHugePage - 1) & ~(kHugePage - 1);
-  auto end = (reinterpret_cast<std::uintptr_t>(buffer) + size) & ~(kHugePage - 1);
-  if (end > begin) madvise(reinterpret_cast<void*>(begin), end - begin, MADV_HUGEPAGE);
-}
 
 std::optional<ReducedSize> reducedSizeFor(std::uint32_t width, std::uint32_t height,
                                           std::uint32_t maxLongSide) {
@@ -42,11 +28,15 @@ RowReducer::RowReducer(std::uint32_t width, std::uint32_t height, ReducedSize si
   for (std::uint32_t x = width; x-- > 0;) {
     firstColumn_[static_cast<std::uint64_t>(x) * size.width / width] = x;
   }
-  columnSums_.assign(static_cast<std::size_t>(width) * static_cast<std::size_t>(channels), 0);
+  // One column more than the source has, always zero: see flush().
+  columnSums_.assign((std::size_t{width} + 1) * static_cast<std::size_t>(channels), 0);
   columnReciprocal_.resize(size.width);
   for (std::uint32_t j = 0; j < size.width; ++j) {
-    columnReciprocal_[j] = 1.0 / (firstColumn_[j + 1] - firstColumn_[j]);
+    std::uint32_t span = firstColumn_[j + 1] - firstColumn_[j];
+    columnReciprocal_[j] = 1.0 / span;
+    atMostTwoColumns_ = atMostTwoColumns_ && span <= 2;
   }
+  lineBytes_.resize(size.width);
 }
 
 void RowReducer::addRow(const std::uint8_t* row) {
@@ -59,7 +49,10 @@ void RowReducer::addRow(const std::uint8_t* row) {
   // Rows are summed column by column first (a loop the compiler vectorises); columns are
   // only combined once per target row.
   std::uint32_t* sums = columnSums_.data();
-  for (std::size_t i = 0, n = columnSums_.size(); i < n; ++i) sums[i] += row[i];
+  for (std::size_t i = 0, n = std::size_t{width_} * static_cast<std::size_t>(channels_); i < n;
+       ++i) {
+    sums[i] += row[i];
+  }
   if (nextRow_ == height_) flush();
 }
 
@@ -70,23 +63,48 @@ void RowReducer::flush() {
   // Sums are whole numbers far below 2^52, so the product with the reciprocals of the
   // block's width and height rounds as the exact quotient would.
   double rowReciprocal = 1.0 / rowsInTarget_;
+  const std::uint32_t* sums = columnSums_.data();
+  if (channels_ == 1 && atMostTwoColumns_) {
+    // The common case of a grey page reduced to more than half its size, kept lean:
+    // the second column is added with a weight of 0 or 1 rather than by a branch on the
+    // block's width, which follows no pattern a predictor learns (past the last column
+    // it reads the spare zero column), and the bytes are packed into words afterwards.
+    std::uint8_t* bytes = lineBytes_.data();
+    for (std::uint32_t j = 0; j < size_.width; ++j) {
+      std::uint32_t first = firstColumn_[j];
+      std::uint32_t sum = sums[first] + sums[first + 1] * (firstColumn_[j + 1] - first - 1);
+      bytes[j] = static_cast<std::uint8_t>(sum * columnReciprocal_[j] * rowReciprocal + 0.5);
+    }
+    std::uint32_t words = size_.width / 4;
+    for (std::uint32_t k = 0; k < words; ++k) {
+      line[k] = (l_uint32{bytes[4 * k]} << 24) | (l_uint32{bytes[4 * k + 1]} << 16) |
+                (l_uint32{bytes[4 * k + 2]} << 8) | bytes[4 * k + 3];
+    }
+    for (std::uint32_t j = words * 4; j < size_.width; ++j) SET_DATA_BYTE(line, j, bytes[j]);
+    std::fill(columnSums_.begin(), columnSums_.end(), 0);
+    rowsInTarget_ = 0;
+    return;
+  }
+  auto channels = static_cast<std::size_t>(channels_);
   for (std::uint32_t j = 0; j < size_.width; ++j) {
-    std::uint32_t first = firstColumn_[j], end = firstColumn_[j + 1];
+    std::uint32_t first = firstColumn_[j], span = firstColumn_[j + 1] - first;
     double reciprocal = columnReciprocal_[j] * rowReciprocal;
-    auto mean = [&](std::uint64_t sum) {
-      return static_cast<l_uint32>(static_cast<double>(sum) * reciprocal + 0.5);
+    const std::uint32_t* block = sums + std::size_t{first} * channels;
+    std::uint64_t sum[4] = {0, 0, 0, 0};
+    if (atMostTwoColumns_) {
+      for (std::size_t c = 0; c < channels; ++c) {
+        sum[c] = block[c] + std::uint64_t{block[channels + c]} * (span - 1);
+      }
+    } else {
+      for (std::size_t k = 0; k < span * channels; ++k) sum[k % channels] += block[k];
+    }
+    auto mean = [&](std::size_t c) {
+      return static_cast<l_uint32>(static_cast<double>(sum[c]) * reciprocal + 0.5);
     };
     if (channels_ == 1) {
-      std::uint64_t sum = 0;
-      for (std::uint32_t x = first; x < end; ++x) sum += columnSums_[x];
-      SET_DATA_BYTE(line, j, mean(sum));
+      SET_DATA_BYTE(line, j, mean(0));
     } else {
-      std::uint64_t sum[4] = {0, 0, 0, 0};
-      for (std::uint32_t x = first; x < end; ++x) {
-        const std::uint32_t* pixel = &columnSums_[static_cast<std::size_t>(x) * 4];
-        sum[0] += pixel[0], sum[1] += pixel[1], sum[2] += pixel[2], sum[3] += pixel[3];
-      }
-      line[j] = (mean(sum[0]) << 24) | (mean(sum[1]) << 16) | (mean(sum[2]) << 8) | mean(sum[3]);
+      line[j] = (mean(0) << 24) | (mean(1) << 16) | (mean(2) << 8) | mean(3);
     }
   }
   std::fill(columnSums_.begin(), columnSums_.end(), 0);
@@ -94,12 +112,9 @@ void RowReducer::flush() {
 }
 
 PIX* createReduced(ReducedSize size, int channels, int xResolution, int yResolution) {
-  PIX* out = pixCreateNoInit(static_cast<l_int32>(size.width), static_cast<l_int32>(size.height),
-                             channels == 1 ? 8 : 32);
+  PIX* out = createPagePix(size.width, size.height, channels == 1 ? 8 : 32);
   if (!out) return nullptr;
   if (channels == 4) pixSetSpp(out, 4);
-  adviseHugePages(pixGetData(out), static_cast<std::size_t>(pixGetWpl(out)) * 4 * size.height);
-  pixSetPadBits(out, 0);
   pixSetResolution(out, static_cast<l_int32>(std::lround(xResolution * size.scale)),
                    static_cast<l_int32>(std::lround(yResolution * size.scale)));
   return out;
