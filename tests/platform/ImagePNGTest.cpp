@@ -28,13 +28,18 @@ struct Spec {
   int bitDepth;
   bool interlaced = false;
   bool transparentKey = false;  // a tRNS chunk naming one colour (or palette entry)
+  // One row filter for every row (PNG_FILTER_*), with the data split over many small
+  // chunks; 0 lets libpng choose and keeps one chunk.
+  int filter = 0;
 };
 
-// The sample of channel `c` at (x, y) for a bit depth, varied enough that a swapped
-// byte, row or channel shows.
+// The sample of channel `c` at (x, y) for a bit depth: scrambled, so that a swapped byte,
+// row or channel shows and the row filters meet every case (Paeth's ties among them).
 int sampleAt(int x, int y, int c, int bitDepth) {
-  int max = (1 << bitDepth) - 1;
-  return (x * 7 + y * 13 + c * 29) % (max + 1);
+  unsigned hash = static_cast<unsigned>(x) * 73856093u ^ static_cast<unsigned>(y) * 19349663u ^
+                  static_cast<unsigned>(c + 1) * 83492791u;
+  hash ^= hash >> 13;
+  return static_cast<int>(hash % (1u << bitDepth));
 }
 
 // What an 8-bit reader must make of a sample: low depths scale up, 16 bits keep the high byte.
@@ -92,6 +97,10 @@ Data writePng(const Spec& spec, int width = kWidth, int height = kHeight) {
   key.blue = static_cast<png_uint_16>(sampleAt(0, 0, 2, spec.bitDepth));
   if (spec.transparentKey) png_set_tRNS(png, info, opaqueAfterFirst, 1, &key);
   png_set_pHYs(png, info, 11811, 11811, PNG_RESOLUTION_METER);  // 300 dpi
+  if (spec.filter) {
+    png_set_filter(png, PNG_FILTER_TYPE_BASE, spec.filter);
+    png_set_compression_buffer_size(png, 32);
+  }
   png_write_info(png, info);
   if (spec.bitDepth < 8) png_set_packing(png);  // rows below hold a sample per byte
   int channels = channelsOf(spec.colorType);
@@ -165,6 +174,14 @@ TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
       {"palette 2", PNG_COLOR_TYPE_PALETTE, 2},
       {"palette 4 interlaced", PNG_COLOR_TYPE_PALETTE, 4, true},
       {"palette 8 with a transparent entry", PNG_COLOR_TYPE_PALETTE, 8, false, true},
+      {"grey 8 sub", PNG_COLOR_TYPE_GRAY, 8, false, false, PNG_FILTER_SUB},
+      {"grey 8 up", PNG_COLOR_TYPE_GRAY, 8, false, false, PNG_FILTER_UP},
+      {"grey 8 average", PNG_COLOR_TYPE_GRAY, 8, false, false, PNG_FILTER_AVG},
+      {"grey 8 paeth", PNG_COLOR_TYPE_GRAY, 8, false, false, PNG_FILTER_PAETH},
+      {"rgb 8 average", PNG_COLOR_TYPE_RGB, 8, false, false, PNG_FILTER_AVG},
+      {"rgb 8 paeth", PNG_COLOR_TYPE_RGB, 8, false, false, PNG_FILTER_PAETH},
+      {"rgba 8 sub", PNG_COLOR_TYPE_RGB_ALPHA, 8, false, false, PNG_FILTER_SUB},
+      {"rgba 8 paeth", PNG_COLOR_TYPE_RGB_ALPHA, 8, false, false, PNG_FILTER_PAETH},
   };
   for (const auto& spec : specs) {
     SCOPED_TRACE(spec.name);
