@@ -7,8 +7,9 @@
 // For each set and level (accurate, fast) it prints images per minute of ours and of
 // the command and their ratio, the character error rate of both against the pages'
 // source, and the share of our process's CPU time spent outside the engine's
-// recognition (decoding, conversion, layout analysis, text, queueing; engine start-up
-// is shown apart). At the end: peak memory of our process and of the largest command.
+// recognition (reading and decoding files, reducing and turning pages, reading the
+// engine's results, layout analysis, text, queueing; engine start-up is shown apart). At the end:
+// peak memory of our process and of the largest command.
 //
 // Usage: bench_ocr [--pages N] [--lines N] [--fast-cap PIXELS]
 //   (defaults: all pages, all lines, the recogniser's own cap for the fast level)
