@@ -1,5 +1,5 @@
-// Bitmaps and images, decoded with Leptonica: PNG, JPEG, TIFF (first page), BMP, GIF,
-// WebP and PNM.
+// Bitmaps and images: PNG decoded with libdeflate or libpng, JPEG, TIFF (first page),
+// BMP, GIF, WebP and PNM with Leptonica.
 //
 // A `Bitmap` is decoded pixels: immutable once made and shared by reference, so it may
 // be read from any thread. An `Image` is a picture as the application hands it around: it

@@ -170,8 +170,9 @@ class CORVEL_EXPORT ImageRequestHandler {
 // Levels: accurate detects the page's orientation (when its short side has at least 300
 // pixels: a strip of a line or two is too little to judge), turns it upright and reads it
 // at full resolution; fast reads as it is, with the long side reduced to at most
-// `fastMaxLongSide` pixels. On Debian's engine and our A4 pages at 300 dpi, fast measured 1.6
-// to 1.9 times the speed of accurate at the same error rate (bench_ocr). Both binarise adaptively
+// `fastMaxLongSide` pixels (a handler reduces a file's image while decoding it). On Debian's
+// engine and our A4 pages at 300 dpi, fast measured 1.5 to 1.9 times the speed of accurate
+// at the same error rate (bench_ocr). Both binarise adaptively
 // (Sauvola), so unevenly lit pages keep their text, and segment the page automatically, so columns
 // stay apart.
 //
