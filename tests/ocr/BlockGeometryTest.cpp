@@ -101,7 +101,7 @@ TEST(BlockGeometry, TwoBlockPredicates) {
 
 TEST(BlockGeometry, TunablesAreReadAtEveryCall) {
   auto p = afterL();
-  TunableGuard word(maxWordSeperation), raise(allowance), column(columnMatchAllowance);
+  TunableGuard word{maxWordSeperation}, raise{allowance}, column{columnMatchAllowance};
   Rect wideGap{0.51, 0.5007, 0.1, 0.02};
   EXPECT_FALSE(p->isSameLine(wideGap));
   maxWordSeperation = 0.02;

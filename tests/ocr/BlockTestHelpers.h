@@ -20,16 +20,10 @@ inline std::string text(const std::shared_ptr<RVRecognitionBlock>& block) {
 }
 
 // Restores a tunable global when the test ends, whatever it did to it.
-class TunableGuard {
- public:
-  explicit TunableGuard(double& value) : value_(value), saved_(value) {}
-  ~TunableGuard() { value_ = saved_; }
-  TunableGuard(const TunableGuard&) = delete;
-  TunableGuard& operator=(const TunableGuard&) = delete;
-
- private:
-  double& value_;
-  double saved_;
+struct TunableGuard {
+  double& value;
+  const double saved = value;
+  ~TunableGuard() { value = saved; }
 };
 
 }  // namespace corvel::testing

@@ -133,8 +133,8 @@ TEST(LayoutEquivalence, ParagraphBuildingMatchesAskingEveryParagraph) {
   std::mt19937 random(11);
   std::uniform_real_distribution<double> unit(0, 1);
   for (int round = 0; round < 60; ++round) {
-    TunableGuard guardLine(maxLineSeperation), guardWord(maxWordSeperation),
-        guardAllowance(allowance);
+    TunableGuard guardLine{maxLineSeperation}, guardWord{maxWordSeperation},
+        guardAllowance{allowance};
     if (round % 3 == 1) {
       maxLineSeperation = 0.002 + 0.01 * unit(random);
       maxWordSeperation = 0.02 * unit(random);
