@@ -1,21 +1,29 @@
-// The layout analyser: driver, columns, paragraphs, and whole pages.
+// The layout analyser: driver, columns, paragraphs, bad geometry, and whole pages (the
+// bundled article, read in recogniser order and shuffled, through the library and through
+// `corvel layout`).
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <limits>
+#include <nlohmann/json.hpp>
+#include <random>
 
 #include "BlockTestHelpers.h"
 #include "Corvelbase/RVTextLayoutAnalyser.h"
+#include "Corvelbase/platform/Files.h"
+#include "support/TestSupport.h"
 
 namespace corvel {
 namespace {
 
+using nlohmann::json;
 using testing::line;
 using testing::text;
 
 std::shared_ptr<RVTextLayoutAnalyser> analysed(const RVBlockArray& lines) {
   auto analyser = RVTextLayoutAnalyser::init();
   analyser->addRecognitionBlocks(lines);
-  analyser->analyse(Size{1000, 1000}, RVWritingDirectionHorizontal);
+  analyser->analyse(Size{2480, 3508}, RVWritingDirectionHorizontal);  // the size is not used
   return analyser;
 }
 
@@ -115,13 +123,6 @@ TEST(LayoutColumns, ATouchingColumnFoundFirstReadsFirst) {
 
 TEST(LayoutParagraphs, LinesContinueTheEarliestParagraphThatTakesThem) {
   auto analyser = RVTextLayoutAnalyser::init();
-  auto only = line("only", 0.1, 0.5, 0.3, 0.02, 42);
-  auto column = RVRecognitionBlock::initColumnWithBlock(only);
-  analyser->buildParagraphBlocks(column);
-  ASSERT_EQ(column->children().size(), 1u);
-  // The paragraph takes the line's box and confidence, and its text.
-  EXPECT_TRUE(column->children().front()->isEqual(RVRecognitionBlock::initWithText(
-      u"only", only->boundingBox(), 42, RVRecognitionBlockLevelParagraph)));
   // Two paragraphs both accept `shared`: the earlier-opened one takes it.
   auto p1 = RVRecognitionBlock::initWithText(u"", Rect{0.1, 0.5, 0.3, 0.02}, 0,
                                              RVRecognitionBlockLevelParagraph);
@@ -134,7 +135,7 @@ TEST(LayoutParagraphs, LinesContinueTheEarliestParagraphThatTakesThem) {
   EXPECT_EQ(analyser->isContinuous(line("far", 0.1, 0.1, 0.3, 0.02), {p1, p2}, &type), nullptr);
   EXPECT_EQ(type, RVBlockMatchSameLine);  // untouched on a miss
   // A column without children ends without paragraphs.
-  column->setChildBlocks(nullptr);
+  auto column = RVRecognitionBlock::initWithText(u"", Rect{}, 0, RVRecognitionBlockLevelColumn);
   analyser->buildParagraphBlocks(column);
   EXPECT_TRUE(column->children().empty());
 }
@@ -158,6 +159,129 @@ TEST(LayoutRobustness, NonFiniteAndNegativeGeometry) {
   // Every line lands once, except one swallowed by a line it shares a row with.
   EXPECT_GE(lines, page.size() - 1);
   EXPECT_LE(lines, page.size());
+}
+
+// ---- Whole pages.
+
+const std::string kArticle = testing::fixturePath("layout/article.json");
+
+RVBlockArray articleLines() {
+  auto bytes = readFile(kArticle);
+  EXPECT_TRUE(bytes);
+  RVBlockArray lines;
+  if (!bytes) return lines;
+  for (const json& entry : json::parse(bytes->begin(), bytes->end())) {
+    lines.push_back(RVRecognitionBlock::initWithText(
+        fromUTF8(entry["text"].get<std::string>()),
+        rectFromString(entry["boundingBox"].get<std::string>()), entry["confidence"].get<double>(),
+        static_cast<RVRecognitionBlockLevel>(entry["level"].get<int>())));
+  }
+  return lines;
+}
+
+// The reading order a person gives the page, as the fixture's line numbers: columns of
+// paragraphs of lines. The heading; the left column, with the caption (17) that sits
+// inside it; the right column. The fixture's texts are all different.
+const std::vector<std::vector<std::vector<std::size_t>>> kReading = {
+    {{0}}, {{1, 3, 5}, {7, 9, 11, 13}, {17}, {18, 19, 20}}, {{2, 4, 6}, {8, 10, 12}, {14, 15, 16}}};
+
+// That order as texts, and the page's text: columns a blank line apart, lines a line feed
+// apart, except the caption: it is folded in unmatched, so it is glued to the line above.
+std::pair<Tree, std::string> articleReading() {
+  RVBlockArray lines = articleLines();
+  std::pair<Tree, std::string> out;
+  for (const auto& column : kReading) {
+    auto& paragraphs = out.first.emplace_back();
+    std::string joined;
+    for (const auto& paragraph : column) {
+      auto& texts = paragraphs.emplace_back();
+      for (std::size_t i : paragraph) {
+        texts.push_back(text(lines.at(i)));
+        joined += (joined.empty() || i == 17 ? "" : "\n") + texts.back();
+      }
+    }
+    out.second += (out.second.empty() ? "" : "\n\n") + joined;
+  }
+  return out;
+}
+
+std::string articleText() { return articleReading().second; }
+
+TEST(LayoutPage, ArticleInAnyLineOrderGivesTheReadingOrderColumnsAndParagraphs) {
+  std::mt19937 random(20240611);
+  const auto [tree, pageText] = articleReading();
+  // Recogniser order (which also gives the text), bottom to top, shuffled.
+  for (int round = 0; round < 6; ++round) {
+    RVBlockArray lines = articleLines();
+    if (round == 1) std::reverse(lines.begin(), lines.end());
+    if (round > 1) std::shuffle(lines.begin(), lines.end(), random);
+    EXPECT_EQ(treeOf(*analysed(lines)), tree) << "round " << round;
+  }
+  EXPECT_EQ(toUTF8(analysed(articleLines())->text()), pageText);
+}
+
+// ---- corvel layout.
+
+testing::CommandResult layout(const std::string& args) {
+  return testing::runCommand(std::string(CORVEL_TOOL_PATH) + " layout " + args);
+}
+
+TEST(LayoutCommand, PrintsTheReadingOrderTextOfJSONAndPlistPages) {
+  PropertyList::Array infos;
+  for (const auto& block : articleLines()) infos.push_back(block->blockInformation());
+  testing::TempDir dir;
+  // Binary property lists go through the same reader as XML ones.
+  std::vector<std::string> pages = {kArticle, dir.file("page.plist")};
+  ASSERT_TRUE(PropertyList(infos).writeToFile(pages[1], PropertyList::Format::XML));
+  for (const std::string& page : pages) {
+    auto result = layout(page);
+    EXPECT_EQ(result.status, 0) << page;
+    EXPECT_EQ(result.output, articleText() + "\n") << page;
+  }
+}
+
+TEST(LayoutCommand, JsonIsTheColumnTreeInTheDictionaryForm) {
+  auto result = layout("--json " + kArticle);
+  ASSERT_EQ(result.status, 0);
+  json columns = json::parse(result.output);
+  ASSERT_EQ(columns.size(), 3u);
+  // The caption, folded into the left column, is its third paragraph, of one line.
+  const json& caption = columns[1]["childBlocks"][2];
+  EXPECT_EQ(std::tuple(columns[1]["level"], caption["level"], caption["childBlocks"][0]["level"]),
+            std::tuple(0, 1, 2));
+  EXPECT_EQ(caption["text"], "Fig. 1: Spraint sites along the lower Wend");
+  EXPECT_EQ(columns[0]["boundingBox"], "{{0.2, 0.9}, {0.6, 0.034}}");
+}
+
+TEST(LayoutCommand, MalformedInputIsAMisuse) {
+  testing::TempDir dir;
+  auto write = [&](const std::string& content) {
+    std::string path = dir.file("page.json");
+    EXPECT_TRUE(writeFileAtomically(path, Data(content.begin(), content.end())));
+    return path;
+  };
+  struct Case {
+    const char* name;
+    std::string content;
+    const char* message;
+  } cases[] = {
+      {"not JSON", "[{\"text\": ", "is not valid JSON"},
+      {"not an array", "{\"text\": \"x\"}", "must hold an array"},
+      {"element not a dictionary", "[{\"text\": \"x\"}, 3]", "element 1 is not a block"},
+      {"neither JSON nor plist", "hello", "neither JSON nor a property list"},
+      {"too deep", std::string(300, '[') + std::string(300, ']'), "nested too deeply"},
+  };
+  for (const Case& c : cases) {
+    auto result = layout(write(c.content) + " 2>&1");
+    EXPECT_EQ(result.status, 2) << c.name;
+    EXPECT_NE(result.output.find(c.message), std::string::npos) << c.name << ": " << result.output;
+  }
+  for (std::string args : {dir.file("missing"), std::string(), "--bogus " + kArticle})
+    EXPECT_EQ(layout(args + " 2>/dev/null").status, 2) << args;
+  // Blocks missing every key are still blocks: an empty page reads as empty text.
+  auto result = layout(write("[{}, {\"boundingBox\": 7}]"));
+  EXPECT_EQ(result.status, 0);
+  EXPECT_EQ(result.output, "\n");
 }
 
 }  // namespace
