@@ -59,7 +59,8 @@ TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
                       {{"yue-Hans", "en-US"}, true},
                       {{"en-US"}, false},  // no secondary codes, even alone
                       {{"ja-JP", "ko-KR"}, false},
-                      {{"ja-JP", "xx-XX"}, false}};
+                      {{"ja-JP", "xx-XX"}, false},
+                      {{"xx-XX"}, false}};
   for (const auto& c : combinations)
     EXPECT_EQ(RVVisionOCR::isLanguageCombinationValid(c.codes), c.valid)
         << ::testing::PrintToString(c.codes);
@@ -70,7 +71,8 @@ TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
   // Only the first forced-primary code moves to the front.
   struct Order {
     Codes in, out;
-  } orders[] = {{{"en-US", "fr-FR"}, {"en-US", "fr-FR"}},
+  } orders[] = {{{}, {}},
+                {{"en-US", "fr-FR"}, {"en-US", "fr-FR"}},
                 {{"en-US", "ko-KR", "ja-JP"}, {"ko-KR", "en-US", "ja-JP"}},
                 {{"xx-XX", "de-DE", "yue-Hant"}, {"yue-Hant", "xx-XX", "de-DE"}}};
   auto job = RVVisionOCR::init();

@@ -93,6 +93,7 @@ TEST_F(OcrJob, RequestSettingsFollowThePlatformVersion) {
       {"newest, fast", {}, {}, true, 3, {}, true},
       {"13", {13, 0, 0}, {}, false, 3, {}, true},
       {"12, fast", {12, 6, 0}, {}, true, 2, {"en-US"}, false},
+      {"11", {11, 0, 0}, {}, false, 2, {"en-US"}, false},
       {"10.15", {10, 15, 0}, {}, false, std::nullopt, {"en-US"}, false},
       // given codes are passed on, the forced-primary one first
       {"newest, French and Japanese", {}, {"fr-FR", "ja-JP"}, false, 3, {"ja-JP", "fr-FR"}, false},
