@@ -1,9 +1,11 @@
 // Recognition jobs with the scripted recogniser: request settings per platform version,
 // observations to blocks, delivery on the main queue, errors, cancelling, the queue's
-// limit; then the operation queues and the main queue beneath them (running once, teardown,
-// draining) where the jobs do not already drive them.
+// limit; the language catalogue (entries, combinations, fast support, ordering, what the
+// recogniser supports); then the operation queues and the main queue beneath them
+// (running once, teardown, draining) where the jobs do not already drive them.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <atomic>
 #include <future>
 #include <thread>
@@ -282,6 +284,104 @@ TEST_F(OcrJob, SixRunAtOnceAndOnlyWaitingJobsAreCancelled) {
   settle();
   EXPECT_EQ(fake_->maxRunning(), 6u);
   for (std::size_t i = 0; i < 8; ++i) EXPECT_EQ(more[i].calls, i < 6 ? 1 : 0) << i;
+}
+
+// ---- The language catalogue, and the languages the recogniser supports.
+
+std::string stringAt(const PropertyList& entry, const char* key) {
+  const PropertyList* value = entry.find(key);
+  return value && value->string() ? toUTF8(*value->string()) : "<none>";
+}
+
+TEST(LanguageCatalogue, HasItsFourteenEntriesWithTheirQuirks) {
+  const auto& catalogue = RVVisionOCR::allVisionLanguages();
+  Codes keys;
+  for (const auto& [key, entry] : catalogue) keys.push_back(key);
+  std::sort(keys.begin(), keys.end());
+  EXPECT_EQ(keys, (Codes{"de-DE", "en-US", "es-ES", "fr-FR", "it-IT", "ja-JP", "ko-KR", "pt-BR",
+                         "ru-RU", "uk-UA", "yue-Hans", "yue-Hant", "zh-Hans", "zh-Hant"}));
+  struct Row {
+    const char* key;
+    const char* isoCode;
+    const char* name;
+    bool eastAsian;
+  } rows[] = {{"zh-Hans", "zh-Hans", "Chinese Simplified", true},
+              // Cantonese entries carry the Chinese codes.
+              {"yue-Hans", "zh-Hans", "Cantonese Simplified", true},
+              {"yue-Hant", "zh-Hant", "Cantonese Traditional", true},
+              {"ko-KR", "ko-KR", "Korean", true},
+              {"en-US", "en-US", "English", false},
+              {"uk-UA", "uk-UA", "Ukranian", false}};  // spelled as hosts know it
+  for (const auto& row : rows) {
+    // East-Asian entries read English as well and must lead the list.
+    PropertyList::Dictionary entry{{"isoCode", fromUTF8(row.isoCode)},
+                                   {"name", fromUTF8(row.name)}};
+    if (row.eastAsian) {
+      entry["secondary"] = PropertyList::Array{u"en-US"};
+      entry["forcePrimary"] = true;
+    }
+    EXPECT_EQ(catalogue.at(row.key), PropertyList(entry))
+        << row.key << ": " << stringAt(catalogue.at(row.key), "name");
+  }
+}
+
+TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
+  // Valid only when led by a code with secondary codes that all the others belong to.
+  struct Combination {
+    Codes codes;
+    bool valid;
+  } combinations[] = {{{}, true},
+                      {{"zh-Hant", "en-US", "zh-Hant"}, true},  // duplicates included
+                      {{"yue-Hans", "en-US"}, true},
+                      {{"en-US"}, false},  // no secondary codes, even alone
+                      {{"ja-JP", "ko-KR"}, false},
+                      {{"ja-JP", "xx-XX"}, false},
+                      {{"xx-XX"}, false}};
+  for (const auto& c : combinations)
+    EXPECT_EQ(RVVisionOCR::isLanguageCombinationValid(c.codes), c.valid)
+        << ::testing::PrintToString(c.codes);
+  // Only the simplified Chinese key turns fast recognition off.
+  EXPECT_TRUE(RVVisionOCR::supportFastRecognition({}));
+  EXPECT_TRUE(RVVisionOCR::supportFastRecognition({"yue-Hans"}));  // by key, not by its code
+  EXPECT_FALSE(RVVisionOCR::supportFastRecognition({"en-US", "zh-Hans"}));
+  // Only the first forced-primary code moves to the front.
+  struct Order {
+    Codes in, out;
+  } orders[] = {{{}, {}},
+                {{"en-US", "fr-FR"}, {"en-US", "fr-FR"}},
+                {{"en-US", "ko-KR", "ja-JP"}, {"ko-KR", "en-US", "ja-JP"}},
+                {{"xx-XX", "de-DE", "yue-Hant"}, {"yue-Hant", "xx-XX", "de-DE"}}};
+  auto job = RVVisionOCR::init();
+  for (const auto& c : orders)
+    EXPECT_EQ(job->orderLanguageCodes(c.in), c.out) << ::testing::PrintToString(c.in);
+}
+
+TEST_F(OcrJob, SupportedLanguagesFollowTheRecognisersOrderFromTenFifteenOn) {
+  fake_->setSupportedLanguages(Codes{"ru-RU", "xx-XX", "yue-Hans", "en-US", "ar-SA"});
+  PlatformRegistry::setPlatformVersion({10, 14, 6});
+  EXPECT_FALSE(RVVisionOCR::supportedLanguages(1));
+  EXPECT_TRUE(fake_->supportedQueries().empty());
+  PlatformRegistry::setPlatformVersion({10, 15, 0});
+  auto entries = RVVisionOCR::supportedLanguages(1);
+  ASSERT_TRUE(entries);
+  ASSERT_EQ(fake_->supportedQueries().size(), 1u);
+  EXPECT_EQ(fake_->supportedQueries()[0].level, 1);
+  EXPECT_EQ(fake_->supportedQueries()[0].revision, 0);
+  // Codes outside the catalogue are skipped; Cantonese comes back under its own name.
+  Codes codes;
+  for (const auto& entry : *entries) codes.push_back(stringAt(entry, "isoCode"));
+  EXPECT_EQ(codes, (Codes{"ru-RU", "zh-Hans", "en-US"}));
+  EXPECT_EQ(stringAt((*entries)[1], "name"), "Cantonese Simplified");
+  // None of them known is an empty answer, not none.
+  fake_->setSupportedLanguages(Codes{"xx-XX"});
+  EXPECT_EQ(RVVisionOCR::supportedLanguages(0), std::vector<PropertyList>{});
+  // A recogniser error gives none, and is logged.
+  testing::LogCapture log;
+  Error error{"test.domain", 5, {}};
+  fake_->setSupportedLanguages(std::nullopt, error);
+  EXPECT_FALSE(RVVisionOCR::supportedLanguages(0));
+  EXPECT_EQ(log.lines(),
+            (std::vector<std::string>{"Error getting Vision Languages: " + error.description()}));
 }
 
 // ---- The queues beneath the jobs.

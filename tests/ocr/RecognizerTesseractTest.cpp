@@ -137,47 +137,18 @@ TEST_F(TesseractRecognition, LinesBecomeObservationsNormalisedFromTheBottomLeft)
 
 // ---- Whole jobs, through the shared queue at once as a host's batch would run them.
 
-struct Page {
-  const char* name;
-  std::vector<std::string> codes;
-  bool fast;
-  double maxErrorRate;
-  bool spaced = true;  // Japanese is written without spaces between words
-};
-
-struct Result {
-  bool delivered = false;
-  std::string text;
-  std::optional<Error> error;
-};
-
-// Recognises the pages through the shared queue at once, as a host's batch would.
-std::vector<Result> recognise(const std::vector<Page>& pages) {
-  std::vector<Result> results(pages.size());
-  for (std::size_t i = 0; i < pages.size(); ++i) {
-    Result* result = &results[i];
-    RVVisionOCR::ocrImageAtPath(
-        fromUTF8(testing::fixturePath(std::string("ocr/") + pages[i].name + ".png")),
-        pages[i].codes, pages[i].fast,
-        [result](const String& text, const std::optional<Error>& error) {
-          result->delivered = true;
-          result->text = toUTF8(text);
-          result->error = error;
-        });
-  }
-  MainQueue::runUntil(
-      [&] {
-        return std::all_of(results.begin(), results.end(),
-                           [](const Result& r) { return r.delivered; });
-      },
-      300s);
-  return results;
-}
-
 // The sources are in reading order, so a page read out of order (columns interleaved or
 // swapped) cannot come within these rates.
 TEST_F(TesseractRecognition, JobsReadEachPageInReadingOrderCloseToItsSource) {
-  const std::vector<Page> pages = {
+  struct Page {
+    const char* name;
+    std::vector<std::string> codes;
+    bool fast;
+    double maxErrorRate;
+    bool spaced = true;  // Japanese is written without spaces between words
+    std::optional<String> text = std::nullopt;
+    std::optional<Error> error = std::nullopt;
+  } pages[] = {
       {"two-columns", {"en-US"}, false, 0.02},
       {"french", {"fr-FR"}, true, 0.02},
       // no codes: the language is detected (Japanese only this way: it also loads its model)
@@ -185,14 +156,25 @@ TEST_F(TesseractRecognition, JobsReadEachPageInReadingOrderCloseToItsSource) {
       {"german", {}, false, 0.02},
       {"japanese", {}, true, 0.05, false},
   };
-  auto results = recognise(pages);
-  for (std::size_t i = 0; i < pages.size(); ++i) {
-    const Page& page = pages[i];
-    const Result& result = results[i];
-    ASSERT_TRUE(result.delivered) << page.name;
-    ASSERT_FALSE(result.error) << page.name << ": " << result.error->description();
-    double rate = characterErrorRate(fixtureText(page.name), result.text, page.spaced);
-    EXPECT_LT(rate, page.maxErrorRate) << page.name << "\n" << result.text;
+  for (Page& page : pages) {
+    RVVisionOCR::ocrImageAtPath(
+        fromUTF8(testing::fixturePath(std::string("ocr/") + page.name + ".png")), page.codes,
+        page.fast, [&page](const String& text, const std::optional<Error>& error) {
+          page.text = text;
+          page.error = error;
+        });
+  }
+  MainQueue::runUntil(
+      [&] {
+        return std::all_of(std::begin(pages), std::end(pages),
+                           [](const Page& p) { return p.text.has_value(); });
+      },
+      300s);
+  for (const Page& page : pages) {
+    ASSERT_TRUE(page.text) << page.name;
+    ASSERT_FALSE(page.error) << page.name << ": " << page.error->description();
+    double rate = characterErrorRate(fixtureText(page.name), toUTF8(*page.text), page.spaced);
+    EXPECT_LT(rate, page.maxErrorRate) << page.name << "\n" << toUTF8(*page.text);
   }
 }
 
