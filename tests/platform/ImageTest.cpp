@@ -28,7 +28,6 @@ TEST(Image, DecodesEveryFormatWithItsPixels) {
         Image::initByReferencingFile(testing::fixturePath(std::string("images/") + c.file));
     auto bitmap = image->bitmap();
     ASSERT_TRUE(bitmap) << c.file << ": " << image->failureReason();
-    EXPECT_EQ(image->failureReason(), "");
     EXPECT_EQ(image->size(), (Size{24, 16})) << c.file;
     Data rgba = bitmap->rgba();
     ASSERT_EQ(rgba.size(), 24u * 16 * 4);
@@ -48,7 +47,6 @@ TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
   Data jpeg = fixtureBytes("sample.jpg");
   Data corrupt = jpeg;
   for (std::size_t i = 200; i < corrupt.size(); ++i) corrupt[i] = 0x5a;
-  std::string text = "just some text, not an image";
   // A PNG whose header claims 30000 x 30000 pixels.
   Data huge = png;
   huge[16] = 0, huge[17] = 0, huge[18] = 0x75, huge[19] = 0x30;
@@ -58,7 +56,6 @@ TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
     Data bytes;
     const char* reasonWord;
   } cases[] = {{"empty", {}, "not an image"},
-               {"text", Data(text.begin(), text.end()), "not an image"},
                {"truncated png", truncated, "corrupt or truncated"},
                {"huge png", huge, "too large"}};
   testing::TempDir dir;
@@ -76,14 +73,11 @@ TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
   }
   // A JPEG with garbage after its header decodes to something or fails; never crashes.
   auto damaged = Image::initWithData(corrupt);
-  if (damaged) {
-    EXPECT_EQ(damaged->size(), (Size{24, 16}));
-  }
+  EXPECT_TRUE(!damaged || damaged->size() == (Size{24, 16}));
   auto missing = Image::initByReferencingFile(dir.file("missing.png"));
   EXPECT_FALSE(missing->bitmap());
   EXPECT_NE(missing->failureReason().find("cannot be read"), std::string::npos);
-  auto directory = Image::initByReferencingFile(dir.path());
-  EXPECT_FALSE(directory->bitmap());
+  EXPECT_FALSE(Image::initByReferencingFile(dir.path())->bitmap());
 }
 
 TEST(Image, FileURLsAreReadAndOtherSchemesRefused) {
@@ -114,18 +108,15 @@ TEST(Image, FileURLsAreReadAndOtherSchemesRefused) {
 
 TEST(Image, JpegEncodingRoundTripsAndComposesAlphaOverWhite) {
   constexpr std::uint32_t kSide = 32;
-  Data rgba(kSide * kSide * 4, 0);
-  for (std::size_t i = 0; i < rgba.size(); i += 4) {
-    rgba[i] = 10, rgba[i + 1] = 200, rgba[i + 2] = 30, rgba[i + 3] = 255;
-  }
-  for (std::size_t i = 0; i < kSide * 8 * 4; i += 4) rgba[i + 3] = 0;  // top 8 rows transparent
+  Data rgba;
+  for (std::size_t i = 0; i < kSide * kSide; ++i)  // the top 8 rows transparent
+    rgba.insert(rgba.end(), {10, 200, 30, std::uint8_t(i < kSide * 8 ? 0 : 255)});
   auto bitmap = Bitmap::fromRGBA(kSide, kSide, rgba.data(), rgba.size());
   ASSERT_TRUE(bitmap);
   auto image = Image::initWithBitmap(bitmap);
   auto best = image->jpegData(1.0), worst = image->jpegData(0.0), odd = image->jpegData(-5);
   ASSERT_TRUE(best && worst && odd);
-  EXPECT_EQ((*best)[0], 0xFF);
-  EXPECT_EQ((*best)[1], 0xD8);
+  EXPECT_LT(worst->size(), best->size());
   EXPECT_EQ(*odd, *worst);  // out-of-range factors clamp
   auto decoded = Image::initWithData(*best);
   ASSERT_TRUE(decoded);
