@@ -39,11 +39,11 @@ PropertyList dictionaryObject(Array keys, Array values, std::uint64_t classUid) 
       {"NS.keys", std::move(keys)}, {"NS.objects", std::move(values)}, {"$class", Uid{classUid}}};
 }
 
-// An NSDictionary (object 1, class 2) with the given key and value references; `more`
-// follows from object 3 on.
-Data dictionaryArchive(Array keys, Array values, Array more = {}) {
-  Array objects{u"$null", dictionaryObject(std::move(keys), std::move(values), 2),
-                classOf(u"NSDictionary")};
+// A dictionary (object 1, its class object 2) with the given key and value references;
+// `more` follows from object 3 on.
+Data dictionaryArchive(Array keys, Array values, Array more = {},
+                       PropertyList cls = classOf(u"NSDictionary")) {
+  Array objects{u"$null", dictionaryObject(std::move(keys), std::move(values), 2), cls};
   objects.insert(objects.end(), more.begin(), more.end());
   return archiveOf(std::move(objects));
 }
@@ -110,14 +110,11 @@ TEST(KeyedArchive, HostileArchivesGiveNothing) {
       {"not an archive", *notArchive.serialize(PropertyList::Format::Binary), "not a keyed"},
       {"root not uid", archiveOf({u"$null"}, PropertyList(u"root")), "not a UID"},
       // Classes outside the allowed few, however they are dressed up.
-      {"array root",
-       archiveOf({u"$null", Dictionary{{"NS.objects", Array{}}, {"$class", Uid{2}}},
-                  classOf(u"NSArray")}),
-       "NSArray"},
+      {"array root", dictionaryArchive({}, {}, {}, classOf(u"NSArray")), "NSArray"},
       {"disguised class",
-       archiveOf({u"$null", dictionaryObject({}, {}, 2),
-                  Dictionary{{"$classname", u"EvilDictionary"},
-                             {"$classes", Array{u"EvilDictionary", u"NSDictionary"}}}}),
+       dictionaryArchive({}, {}, {},
+                         Dictionary{{"$classname", u"EvilDictionary"},
+                                    {"$classes", Array{u"EvilDictionary", u"NSDictionary"}}}),
        "EvilDictionary"},
       // References that lead nowhere or back, and entries of the wrong kind.
       {"dangling key", dictionaryArchive({Uid{40}}, {Uid{2}}), "past the object table"},
