@@ -59,8 +59,8 @@ TEST(RectText, WritesThePlatformFormAndReadsItBackExactly) {
     Rect r{v[0], v[1], v[2], v[3]};
     ASSERT_EQ(rectFromString(stringFromRect(r)), r) << stringFromRect(r);
   }
-  Rect infinite{std::numeric_limits<double>::infinity(), -std::numeric_limits<double>::infinity(),
-                0, 1};
+  const double inf = std::numeric_limits<double>::infinity();
+  Rect infinite{inf, -inf, 0, 1};
   EXPECT_EQ(rectFromString(stringFromRect(infinite)), infinite);
 }
 

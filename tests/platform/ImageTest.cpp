@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
-#include <filesystem>
+#include <algorithm>
+#include <regex>
 
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Image.h"
@@ -31,22 +32,19 @@ TEST(Image, DecodesEveryFormatWithItsPixels) {
     EXPECT_EQ(image->size(), (Size{24, 16})) << c.file;
     Data rgba = bitmap->rgba();
     ASSERT_EQ(rgba.size(), 24u * 16 * 4);
-    // Pixel (x=20, y=10): red 200, green 150, blue 0.
-    const std::uint8_t* p = &rgba[(10 * 24 + 20) * 4];
-    int tolerance = c.lossless ? 0 : 24;
-    EXPECT_NEAR(p[0], 200, tolerance) << c.file;
-    EXPECT_NEAR(p[1], 150, tolerance) << c.file;
-    EXPECT_NEAR(p[2], 0, tolerance) << c.file;
-    EXPECT_EQ(p[3], 255) << c.file;
+    // Pixel (x=20, y=10): red 200, green 150, blue 0, opaque.
+    const int expected[] = {200, 150, 0, 255};
+    for (int k = 0; k < 4; ++k)
+      EXPECT_NEAR(rgba[(10 * 24 + 20) * 4 + k], expected[k], c.lossless || k == 3 ? 0 : 24)
+          << c.file << " channel " << k;
   }
 }
 
 TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
   Data png = fixtureBytes("sample.png");
   Data truncated(png.begin(), png.begin() + static_cast<long>(png.size() / 2));
-  Data jpeg = fixtureBytes("sample.jpg");
-  Data corrupt = jpeg;
-  for (std::size_t i = 200; i < corrupt.size(); ++i) corrupt[i] = 0x5a;
+  Data corrupt = fixtureBytes("sample.jpg");
+  std::fill(corrupt.begin() + 200, corrupt.end(), 0x5a);
   // A PNG whose header claims 30000 x 30000 pixels.
   Data huge = png;
   huge[16] = 0, huge[17] = 0, huge[18] = 0x75, huge[19] = 0x30;
@@ -82,27 +80,22 @@ TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
 
 TEST(Image, FileURLsAreReadAndOtherSchemesRefused) {
   std::string path = testing::fixturePath("images/sample.png");
-  std::string escaped = path;
-  for (std::size_t i = escaped.find('/', 1); i != std::string::npos; i = escaped.find('/', i + 3)) {
-    escaped.replace(i, 1, "%2F");
-  }
-  for (const std::string& url : {"file://" + path, "file:" + path, "FILE://localhost" + path,
-                                 "file:///" + escaped.substr(1)}) {
+  std::string escaped = std::regex_replace(path.substr(1), std::regex("/"), "%2F");
+  for (const std::string& url :
+       {"file://" + path, "file:" + path, "FILE://localhost" + path, "file:///" + escaped}) {
     auto image = Image::initByReferencingURL(url);
     EXPECT_TRUE(image->bitmap()) << url << ": " << image->failureReason();
   }
-  struct Refused {
-    std::string url;
-    const char* reasonWord;
-  } refused[] = {{"https://example.com/a.png", "https"},
-                 {"file://otherhost" + path, "another host"},
-                 {"file://", "names no file"},
-                 {"no-scheme.png", "not a URL"}};
-  for (const auto& r : refused) {
-    auto image = Image::initByReferencingURL(r.url);
-    EXPECT_FALSE(image->bitmap()) << r.url;
-    EXPECT_NE(image->failureReason().find(r.reasonWord), std::string::npos)
-        << r.url << ": " << image->failureReason();
+  const std::pair<std::string, const char*> refused[] = {
+      {"https://example.com/a.png", "https"},
+      {"file://otherhost" + path, "another host"},
+      {"file://", "names no file"},
+      {"no-scheme.png", "not a URL"}};
+  for (const auto& [url, reasonWord] : refused) {
+    auto image = Image::initByReferencingURL(url);
+    EXPECT_FALSE(image->bitmap()) << url;
+    EXPECT_NE(image->failureReason().find(reasonWord), std::string::npos)
+        << url << ": " << image->failureReason();
   }
 }
 

@@ -76,38 +76,34 @@ std::u16string textOf(const std::string& rtf) {
 }
 
 TEST(RtfdHostile, MalformedRtfLoadsWhatIsSafe) {
-  struct Case {
-    const char* name;
-    std::string rtf;
-    std::u16string text;
-  } cases[] = {
+  // The document and the text it gives.
+  const std::pair<std::string, std::u16string> cases[] = {
       // Not RTF at all.
-      {"empty", "", u"<none>"},
-      {"plain text", "hello", u"<none>"},
+      {"", u"<none>"},
       // Unbalanced groups: the document ends where its group closes, or at the end.
-      {"extra closers", "{\\rtf1 a}}}} b", u"a"},
-      {"never closed", "{\\rtf1 a{{{ b", u"a b"},
+      {"{\\rtf1 a}}}} b", u"a"},
+      {"{\\rtf1 a{{{ b", u"a b"},
       // Truncated escapes are dropped, not misread.
-      {"cut hex", "{\\rtf1 a\\'4", u"a"},
-      {"bad hex", "{\\rtf1 a\\'zzb}", u"azzb"},
-      {"cut graphic", "{\\rtf1 a{{\\NeXTGraphic x.png", u"a"},
-      {"graphic at top", "{\\rtf1 a\\NeXTGraphic x.png b}", u"a"},
+      {"{\\rtf1 a\\'4", u"a"},
+      {"{\\rtf1 a\\'zzb}", u"azzb"},
+      {"{\\rtf1 a{{\\NeXTGraphic x.png", u"a"},
+      {"{\\rtf1 a\\NeXTGraphic x.png b}", u"a"},
       // Unicode escapes at their limits.
-      {"negative u", "{\\rtf1 \\u-4?}", u"\uFFFC"},
-      {"code point u", "{\\rtf1 \\u128512?}", u"\U0001F600"},
-      {"huge u", "{\\rtf1 \\u99999999999999999999?x}", u"x"},
-      {"uc skips", "{\\rtf1\\uc2 \\u233ab\\u233\\'e9\\'e9c}", u"\u00e9\u00e9c"},
-      {"uc ends at group", "{\\rtf1\\uc3 {\\u233a}b}", u"\u00e9b"},
+      {"{\\rtf1 \\u-4?}", u"\uFFFC"},
+      {"{\\rtf1 \\u128512?}", u"\U0001F600"},
+      {"{\\rtf1 \\u99999999999999999999?x}", u"x"},
+      {"{\\rtf1\\uc2 \\u233ab\\u233\\'e9\\'e9c}", u"\u00e9\u00e9c"},
+      {"{\\rtf1\\uc3 {\\u233a}b}", u"\u00e9b"},
       // Binary data is skipped by its count, even past the end.
-      {"bin", "{\\rtf1 a\\bin3 }}}b}", u"ab"},
-      {"bin past end", "{\\rtf1 a\\bin99999999999 b}", u"a"},
+      {"{\\rtf1 a\\bin3 }}}b}", u"ab"},
+      {"{\\rtf1 a\\bin99999999999 b}", u"a"},
       // Ignorable and skipped destinations.
-      {"star", "{\\rtf1 a{\\*\\unknown zzz}b}", u"ab"},
+      {"{\\rtf1 a{\\*\\unknown zzz}b}", u"ab"},
       // Other code pages decode through ICU; unknown ones fall back to Windows-1252.
-      {"shift-jis", "{\\rtf1\\ansi\\ansicpg932 \\'93\\'fa}", u"\u65e5"},
-      {"unknown page", "{\\rtf1\\ansi\\ansicpg99999 \\'e9}", u"\u00e9"},
+      {"{\\rtf1\\ansi\\ansicpg932 \\'93\\'fa}", u"\u65e5"},
+      {"{\\rtf1\\ansi\\ansicpg99999 \\'e9}", u"\u00e9"},
   };
-  for (const auto& c : cases) EXPECT_EQ(textOf(c.rtf), c.text) << c.name;
+  for (const auto& [rtf, text] : cases) EXPECT_EQ(textOf(rtf), text) << rtf;
 }
 
 TEST(RtfdHostile, EveryTruncationOfAWrittenDocumentReadsAsItsBeginning) {
@@ -119,7 +115,7 @@ TEST(RtfdHostile, EveryTruncationOfAWrittenDocumentReadsAsItsBeginning) {
   Data rtf = *bundle->fileWrappers().at(RTFDTextFileName)->regularFileContents();
   const String& full = text.string();
   for (std::size_t cut = 5; cut <= rtf.size(); ++cut) {
-    auto read = attributedStringWithRTF(Data(rtf.begin(), rtf.begin() + static_cast<long>(cut)));
+    auto read = attributedStringWithRTF(Data(rtf.begin(), rtf.begin() + cut));
     ASSERT_TRUE(read) << cut;
     // Everything but the last unit is a prefix (a cut escape such as "\u23" for "\u233"
     // may give one other character).
@@ -155,22 +151,18 @@ TEST(RtfdHostile, BrokenFlatFormsAreRefused) {
   ASSERT_TRUE(attributedStringWithRTFD(flat));
   // Every strict prefix is refused whole: a bundle cut short is no bundle.
   for (std::size_t cut = 0; cut < flat.size(); ++cut)
-    EXPECT_FALSE(
-        attributedStringWithRTFD(Data(flat.begin(), flat.begin() + static_cast<long>(cut))))
-        << cut;
+    EXPECT_FALSE(attributedStringWithRTFD(Data(flat.begin(), flat.begin() + cut))) << cut;
   // Absurd counts and lengths fail without allocating them.
-  struct Case {
-    const char* name;
-    std::size_t at;
-    std::uint32_t word;  // written little-endian over the bytes at `at`
-  } cases[] = {{"wrong magic", 0, 0x78787878},
-               {"unknown record type", 8, 7},
-               {"child count", 12, 0x7F0000FF},
-               {"name length", 16, 0x7FFFFFFF}};
-  for (const auto& c : cases) {
+  // Each case writes a word little-endian over the bytes at an offset.
+  const std::tuple<const char*, std::size_t, std::uint32_t> cases[] = {
+      {"wrong magic", 0, 0x78787878},
+      {"unknown record type", 8, 7},
+      {"child count", 12, 0x7F0000FF},
+      {"name length", 16, 0x7FFFFFFF}};
+  for (const auto& [name, at, word] : cases) {
     Data broken = flat;
-    for (int i = 0; i < 4; ++i) broken[c.at + i] = static_cast<std::uint8_t>(c.word >> (8 * i));
-    EXPECT_FALSE(attributedStringWithRTFD(broken)) << c.name;
+    for (int i = 0; i < 4; ++i) broken[at + i] = static_cast<std::uint8_t>(word >> (8 * i));
+    EXPECT_FALSE(attributedStringWithRTFD(broken)) << name;
   }
   // A bundle without TXT.rtf, or with a directory in its place, is no document.
   auto noText = FileWrapper::initDirectoryWithFileWrappers(
