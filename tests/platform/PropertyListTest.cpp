@@ -6,7 +6,6 @@
 
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
-#include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/PropertyList.h"
 #include "support/TestSupport.h"
 
@@ -71,6 +70,7 @@ TEST(PropertyList, FilesAreWrittenWholeAndReadBack) {
   EXPECT_EQ(std::distance(std::filesystem::directory_iterator(dir.path()), {}), 1);
 }
 
+// A host's own caches directory is walked by the drawings' tests.
 TEST(Files, CachesDirectoryFollowsTheEnvironmentAndIsCreated) {
   testing::TempDir dir;
   std::string xdg = dir.file("xdg");
@@ -81,9 +81,6 @@ TEST(Files, CachesDirectoryFollowsTheEnvironmentAndIsCreated) {
   std::string home = dir.file("home");
   setenv("HOME", home.c_str(), 1);
   EXPECT_EQ(cachesDirectory(), home + "/.cache");
-  PlatformRegistry::setCachesDirectory(dir.file("override"));
-  EXPECT_EQ(cachesDirectory(), dir.file("override"));
-  PlatformRegistry::setCachesDirectory(std::nullopt);
   unsetenv("XDG_CACHE_HOME");
 }
 
