@@ -73,13 +73,12 @@ TEST_F(DrawingLife, DrawingsComeThroughCopyPasteSaveAndLoadUnchanged) {
   std::string b = insert(text, 15, Size{70, 20}, strokesB);
 
   // Copy "e <A> a" as the text system does: the drawings' item sits beside the flat RTFD
-  // holding A alone, and the picture is back to editing.
+  // holding A alone.
   text.preCutOrCopy(Range{5, 5});
   PasteboardItem written;
   written.setData(RTFDFromRange(text, Range{5, 5}), kFlatRTFD);
   pasteboard->writeItems({written});
   text.postCutOrCopy(Range{5, 5});
-  EXPECT_EQ(text.attachmentAtIndex(7)->fileWrapper(), nullptr);
   auto items = pasteboard->items();
   ASSERT_EQ(items.size(), 1u);
   EXPECT_EQ(items[0].types(), (std::vector<std::string>{kFlatRTFD, RVPencilPasteboardData}));

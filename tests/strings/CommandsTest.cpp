@@ -26,7 +26,7 @@ TEST(StringCommands, UtiLangAndHeaderPrintTheAnswerOrExitWithWhy) {
   std::string de = file(dir, "de.txt",
                         "Wir haben das ganze Wochenende den Dachboden aufgeräumt und alte Briefe "
                         "gefunden.");
-  std::string digits = file(dir, "digits.txt", "1234 5678 90"), empty = file(dir, "e.txt", "");
+  std::string digits = file(dir, "digits.txt", "1234 5678 90");
   std::string bad = file(dir, "bad.txt", "\xff\xfe\x80 \xc3"), missing = "'" + dir.file("no") + "'";
   std::string mail =
       file(dir, "m.eml", "From: Ada Lovelace <ada@example.com>\r\nSubject: Grüße\r\n\r\nBody\r\n");
@@ -39,26 +39,17 @@ TEST(StringCommands, UtiLangAndHeaderPrintTheAnswerOrExitWithWhy) {
       {"uti " + folder, 0, "public.folder\npublic.directory\npublic.item\n"},
       {"uti com.example.unknown", 0, "com.example.unknown\n"},
       {"uti", 2, ""},
-      {"uti ''", 2, ""},
       // lang: the code from a file or standard input; 1 when undetermined.
       {"lang " + de, 0, "de\n"},
       {"lang < " + de, 0, "de\n"},
-      {"lang - < " + de, 0, "de\n"},
       {"lang " + digits, 1, ""},
-      {"lang " + empty, 1, ""},
       {"lang " + bad, 1, ""},
       {"lang " + missing, 2, ""},
-      {"lang " + folder, 2, ""},
       {"lang --fast", 2, ""},
       // header: the value, or with --address the address; 1 when there is none.
       {"header subject " + mail, 0, "Grüße\n"},
-      {"header From " + mail, 0, "Ada Lovelace <ada@example.com>\n"},
-      {"header From --address " + mail, 0, "ada@example.com\n"},
-      {"header --address From " + mail, 0, "ada@example.com\n"},
-      {"header From --address < " + mail, 0, "ada@example.com\n"},
+      {"header --address From < " + mail, 0, "ada@example.com\n"},
       {"header Subject --address " + mail, 1, ""},
-      {"header 'Subject(' " + mail, 1, ""},
-      {"header", 2, ""},
       {"header From " + mail + " extra", 2, ""},
       {"header From " + missing, 2, ""},
   };
