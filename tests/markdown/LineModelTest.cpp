@@ -32,9 +32,7 @@ TEST(LinesForRange, TakesTheLinesASelectionTouches) {
       {"empty text", u"", {0, 0}, {{u"", {0, 0}}}},
       {"caret after final feed", u"abc\n", {4, 0}, {{u"", {4, 0}}}},
       {"caret at end, no final feed", u"abc", {3, 0}, {{u"abc", {0, 3}}}},
-      {"caret before a feed", u"a\nb\nc", {1, 0}, {{u"a\n", {0, 2}}}},
       {"ends at a line start", u"a\nb\nc", {0, 2}, {{u"a\n", {0, 2}}}},
-      {"lone CR is no break", u"a\rb", {2, 0}, {{u"a\rb", {0, 3}}}},
       {"not-found location", u"ab", NotFoundRange, {{u"ab", {0, 2}}}},
   };
   for (const auto& [what, text, selection, expected] : cases)

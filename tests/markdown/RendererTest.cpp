@@ -67,7 +67,6 @@ TEST(Rendered, TasksAndNumbersMakeLists) {
   std::string numbers = renderEdited(doc, all, md::insertNumberedList);
   EXPECT_EQ(count(numbers, "<ol>"), 1u) << numbers;
   EXPECT_EQ(count(numbers, "<li>(alpha|beta|gamma)</li>"), 3u) << numbers;
-  EXPECT_LT(numbers.find("alpha"), numbers.find("gamma"));
 }
 
 TEST(Rendered, QuoteRuleAndCodeBlock) {
