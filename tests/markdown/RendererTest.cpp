@@ -17,8 +17,7 @@ std::string render(const String& markdown) {
   testing::TempDir dir;
   std::string path = dir.file("doc.md");
   std::string bytes = toUTF8(markdown);
-  EXPECT_TRUE(
-      writeFileAtomically(path, reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size()));
+  EXPECT_TRUE(writeFileAtomically(path, Data(bytes.begin(), bytes.end())));
   testing::CommandResult result =
       testing::runCommand("cmark-gfm -e table -e tasklist '" + path + "'");
   EXPECT_EQ(result.status, 0) << "cmark-gfm failed";

@@ -25,7 +25,6 @@ TEST(HeaderValue, ReadsTheFirstMatchingLineAndItsAddress) {
   const std::tuple<const char16_t*, bool, std::optional<std::u16string>> cases[] = {
       // Field names match in any case; the value is the rest of the line.
       {u"subject", false, u"Hello"},
-      {u"From", false, u"Ada Lovelace <ada@example.com>"},
       {u"Cc", false, u"Jane <jane@example.net>"},  // a tab is white space too
       // Exactly one white-space character is eaten: a second one is part of the value.
       {u"Date", false, u" Mon, 2 Jan 2023 10:00:00 +0000"},
