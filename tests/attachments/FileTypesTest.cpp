@@ -58,8 +58,7 @@ TEST(FileTypes, KindsComeFromTheTypeAndOnlyWithoutOneFromTheFile) {
   auto bare = TextAttachment::init();  // no wrapper and no type
   EXPECT_EQ(kinds(*bare), "----");
 
-  // The helpers on their own: a folder has a type too; an absent argument answers no.
-  EXPECT_TRUE(bare->isFile(dir.path(), "public.folder"));
+  // The helpers on their own: an absent argument answers no.
   EXPECT_FALSE(bare->isFile(dir.file("clip.mov"), std::nullopt));
   EXPECT_FALSE(bare->doesFileType(std::nullopt, "public.item"));
   EXPECT_FALSE(bare->doesFileType("public.item", "public.jpeg"));

@@ -18,10 +18,10 @@ TEST(UTI, ConformanceAndEqualityGoThroughTheValidStringNilAnswersNo) {
       {u"com.apple.finder.textclipping", u"public.item", true, false},
       // The clipping test is exact: another case is just an unknown identifier.
       {u"COM.APPLE.FINDER.TEXTCLIPPING", u"com.corvelworks.tessel.unknown", false, false},
-      // Ordinary types.
-      {u"Public.JPEG", u"public.jpeg", true, true},
+      // The types the library declares for its own documents.
       {u"com.corvelworks.tessel.formattednote", u"public.content", true, false},
       {u"com.corvelworks.tessel.database", u"public.content", false, false},
+      // Empty identifiers are equal, like any two equal strings.
       {u"", u"", true, true},
   };
   for (const auto& c : cases) {
