@@ -58,11 +58,7 @@ struct ReducedSize {
 std::optional<ReducedSize> reducedSizeFor(std::uint32_t width, std::uint32_t height,
                                           std::uint32_t maxLongSide);
 
-// A new 8-bit (1 channel) or 32-bit (4 channels) picture of a reduced size, its
-// resolution reduced alike.
-PIX* createReduced(ReducedSize size, int channels, int xResolution, int yResolution);
-
-// Reduces rows given top to bottom into `out` (made by createReduced): every target pixel
+// Reduces rows given top to bottom into `out` (of the reduced size): every target pixel
 // is the rounded mean of the block of whole source pixels that falls in it. Rows are in
 // PNG's byte order: a byte per pixel for 1 channel, R, G, B, A for 4.
 class RowReducer {
@@ -84,6 +80,34 @@ class RowReducer {
   std::vector<std::uint8_t> lineBytes_;     // a grey target row before packing
   std::uint32_t nextRow_ = 0, currentTarget_ = 0, rowsInTarget_ = 0;
 };
+
+// Builds a picture from rows given top to bottom in PNG's byte order (a byte per pixel
+// for grey, R, G, B, A for colour): whole, or reduced to fit `maxLongSide` as it goes.
+class PictureBuilder {
+ public:
+  // `channels` is 1 (grey, 8 bits) or 4 (32 bits; samples per pixel 4 with `alpha`, else
+  // 3); the resolution is in dots per inch, 0 when unknown.
+  PictureBuilder(std::uint32_t width, std::uint32_t height, int channels, bool alpha,
+                 std::uint32_t maxLongSide, l_int32 xResolution, l_int32 yResolution);
+  ~PictureBuilder();
+  PictureBuilder(const PictureBuilder&) = delete;
+  PictureBuilder& operator=(const PictureBuilder&) = delete;
+
+  // False when there was no memory for the picture.
+  bool ready() const { return pix_ != nullptr; }
+  void addRow(const std::uint8_t* row);
+  // The picture (once every row is in); the caller owns it.
+  PIX* take();
+
+ private:
+  PIX* pix_ = nullptr;
+  std::optional<RowReducer> reducer_;
+  std::uint32_t width_, nextRow_ = 0;
+  int channels_;
+};
+
+// Dots per inch from a PNG's pixels per metre.
+l_int32 dotsPerInch(std::uint32_t perMetre);
 
 // `pix` (1, 8 or 32 bits) reduced so that its long side is at most `maxLongSide`, in the
 // same way as while decoding; nullptr when it already fits or cannot be reduced. Bilevel

@@ -32,11 +32,12 @@ struct Reader {
   bool alpha;  // 32 bits: R, G, B, A rather than R, G, B and filler
   int passes;  // 1, or 7 for an interlaced image
   l_int32 xResolution, yResolution;
-  // Filled by readRows: either every row of `pix`, or `reducer` a row at a time from `row`.
+  // Filled by readRows: either the bilevel `pix` directly, or `builder` from `row`.
   PIX* pix;
-  RowReducer* reducer;
+  PictureBuilder* builder;
   png_bytep row;
-  png_bytep* rows;  // row pointers into `pix` for interlaced images
+  png_bytep* rows;  // row pointers for interlaced images
+  png_bytep image;  // every row of an interlaced image for the builder
 };
 
 void readBytes(png_structp png, png_bytep out, png_size_t length) {
@@ -55,8 +56,8 @@ void readBytes(png_structp png, png_bytep out, png_size_t length) {
 void ignoreWarning(png_structp, png_const_charp) {}
 
 // Reads the header and sets up libpng to deliver rows of 1 bit for black-and-white
-// images, 8 bits for grey, 4 bytes otherwise; when `reduce`, bilevel rows come as grey
-// too. False with reader->message on failure.
+// images (kept at 1 bit unless they are to be reduced), a byte per pixel for grey, 4
+// bytes otherwise. False with reader->message on failure.
 bool readHeader(png_structp png, png_infop info, bool reduce, std::uint32_t maxLongSide,
                 Reader* reader) {
   if (setjmp(png_jmpbuf(png))) return false;
@@ -74,8 +75,7 @@ bool readHeader(png_structp png, png_infop info, bool reduce, std::uint32_t maxL
   int colorType = png_get_color_type(png, info);
   int bitDepth = png_get_bit_depth(png, info);
   bool transparency = png_get_valid(png, info, PNG_INFO_tRNS) != 0;
-  reduce = reduce && png_get_interlace_type(png, info) == PNG_INTERLACE_NONE &&
-           reducedSizeFor(reader->width, reader->height, maxLongSide);
+  reduce = reduce && reducedSizeFor(reader->width, reader->height, maxLongSide);
   bool bilevel = !reduce && colorType == PNG_COLOR_TYPE_GRAY && bitDepth == 1 && !transparency;
   if (bitDepth == 16) png_set_strip_16(png);  // the high byte, as Leptonica keeps it
   if (colorType == PNG_COLOR_TYPE_PALETTE) png_set_palette_to_rgb(png);
@@ -93,35 +93,39 @@ bool readHeader(png_structp png, png_infop info, bool reduce, std::uint32_t maxL
   png_uint_32 xPerMetre = 0, yPerMetre = 0;
   int unit = 0;
   if (png_get_pHYs(png, info, &xPerMetre, &yPerMetre, &unit) && unit == PNG_RESOLUTION_METER) {
-    reader->xResolution = static_cast<l_int32>(xPerMetre / 39.37 + 0.5);
-    reader->yResolution = static_cast<l_int32>(yPerMetre / 39.37 + 0.5);
+    reader->xResolution = dotsPerInch(xPerMetre);
+    reader->yResolution = dotsPerInch(yPerMetre);
   }
   return true;
 }
 
-// Decodes every row into reader->pix, or through reader->reducer. Whatever follows the
+// Decodes every row into reader->pix or through reader->builder. Whatever follows the
 // pixels (text, time, the end marker) is not needed: the image data's checksums have
 // been compared by the time the last row is out. False with reader->message on failure.
 bool readRows(png_structp png, png_infop info, Reader* reader) {
   if (setjmp(png_jmpbuf(png))) return false;
-  if (reader->reducer) {
-    for (png_uint_32 y = 0; y < reader->height; ++y) {
-      png_read_row(png, reader->row, nullptr);
-      reader->reducer->addRow(reader->row);
-    }
-    return true;
-  }
-  auto* data = reinterpret_cast<png_bytep>(pixGetData(reader->pix));
-  std::size_t stride = static_cast<std::size_t>(pixGetWpl(reader->pix)) * 4;
-  if (png_get_rowbytes(png, info) > stride) png_error(png, "unexpected row size");
+  std::size_t rowBytes = png_get_rowbytes(png, info);
+  std::size_t stride =
+      reader->pix ? std::size_t{4} * static_cast<std::size_t>(pixGetWpl(reader->pix)) : rowBytes;
+  if (rowBytes > stride) png_error(png, "unexpected row size");
+  png_bytep first = reader->pix ? reinterpret_cast<png_bytep>(pixGetData(reader->pix)) : nullptr;
   if (reader->passes > 1) {
     // Interlaced passes fill in each row several times, so every row must be at hand.
     reader->rows = static_cast<png_bytep*>(std::malloc(reader->height * sizeof(png_bytep)));
-    if (!reader->rows) png_error(png, "there is not enough memory for the image");
-    for (png_uint_32 y = 0; y < reader->height; ++y) reader->rows[y] = data + y * stride;
+    if (!first)
+      first = reader->image = static_cast<png_bytep>(std::malloc(rowBytes * reader->height));
+    if (!reader->rows || !first) png_error(png, "there is not enough memory for the image");
+    for (png_uint_32 y = 0; y < reader->height; ++y) reader->rows[y] = first + y * stride;
     png_read_image(png, reader->rows);
+    if (reader->builder) {
+      for (png_uint_32 y = 0; y < reader->height; ++y) reader->builder->addRow(reader->rows[y]);
+    }
   } else {
-    for (png_uint_32 y = 0; y < reader->height; ++y) png_read_row(png, data + y * stride, nullptr);
+    for (png_uint_32 y = 0; y < reader->height; ++y) {
+      png_bytep row = reader->builder ? reader->row : first + y * stride;
+      png_read_row(png, row, nullptr);
+      if (reader->builder) reader->builder->addRow(row);
+    }
   }
   return true;
 }
@@ -136,42 +140,40 @@ PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLon
   reader.size = size;
   png_structp png = png_create_read_struct(PNG_LIBPNG_VER_STRING, &reader, fail, ignoreWarning);
   png_infop info = png ? png_create_info_struct(png) : nullptr;
-  std::optional<RowReducer> reducer;
+  std::optional<PictureBuilder> builder;
   std::vector<std::uint8_t> row;
   bool decoded = info && readHeader(png, info, maxLongSide > 0, maxLongSide, &reader);
-  if (decoded) {
-    auto reduced = reader.passes == 1 && reader.depth != 1
-                       ? reducedSizeFor(reader.width, reader.height, maxLongSide)
-                       : std::nullopt;
-    int channels = reader.depth == 32 ? 4 : 1;
-    reader.pix = reduced ? createReduced(*reduced, channels, reader.xResolution, reader.yResolution)
-                         : createPagePix(reader.width, reader.height, reader.depth);
-    if (reader.pix && reduced) {
-      reducer.emplace(reader.width, reader.height, *reduced, channels, reader.pix);
-      reader.reducer = &*reducer;
-      row.resize(png_get_rowbytes(png, info));
-      reader.row = row.data();
-    } else if (reader.pix) {
-      pixSetResolution(reader.pix, reader.xResolution, reader.yResolution);
-    }
-    if (reader.pix && reader.depth == 32) pixSetSpp(reader.pix, reader.alpha ? 4 : 3);
-    decoded = reader.pix && readRows(png, info, &reader);
-    if (!reader.pix) std::snprintf(reader.message, sizeof reader.message, "out of memory");
+  if (decoded && reader.depth == 1) {
+    reader.pix = createPagePix(reader.width, reader.height, 1);
+    if (reader.pix) pixSetResolution(reader.pix, reader.xResolution, reader.yResolution);
+  } else if (decoded) {
+    builder.emplace(reader.width, reader.height, reader.depth == 32 ? 4 : 1, reader.alpha,
+                    maxLongSide, reader.xResolution, reader.yResolution);
+    if (builder->ready()) reader.builder = &*builder;
+    row.resize(png_get_rowbytes(png, info));
+    reader.row = row.data();
   }
+  if (decoded && !reader.pix && !reader.builder) {
+    std::snprintf(reader.message, sizeof reader.message,
+                  "there is not enough memory for the image");
+    decoded = false;
+  }
+  decoded = decoded && readRows(png, info, &reader);
   png_destroy_read_struct(&png, info ? &info : nullptr, nullptr);
   std::free(reader.rows);
+  std::free(reader.image);
   if (!decoded) {
     pixDestroy(&reader.pix);
     *failure = "the PNG image is corrupt or truncated";
     if (reader.message[0]) *failure += std::string(" (") + reader.message + ")";
     return nullptr;
   }
-  if (reader.reducer) return reader.pix;  // written in Leptonica's order already
-  // PNG stores pixels in reading order, a byte at a time; Leptonica keeps them in 32-bit
-  // words with the first pixel in the high byte, and counts 1 as black where PNG counts
-  // 1 as white.
+  if (builder) return builder->take();
+  // PNG packs bilevel pixels first in the high bit of a byte; Leptonica keeps them in
+  // 32-bit words with the first pixel in the high bit, and counts 1 as black where PNG
+  // counts 1 as white.
   pixEndianByteSwap(reader.pix);
-  if (reader.depth == 1) pixInvert(reader.pix, reader.pix);
+  pixInvert(reader.pix, reader.pix);
   return reader.pix;
 }
 

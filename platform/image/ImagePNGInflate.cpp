@@ -61,8 +61,8 @@ bool readLayout(const std::uint8_t* bytes, std::size_t size, Layout* layout) {
     } else if (is("IEND")) {
       return !layout->data.empty();
     } else if (is("pHYs") && length == 9 && body[8] == 1) {  // per metre
-      layout->xResolution = static_cast<l_int32>(bigEndian32(body) / 39.37 + 0.5);
-      layout->yResolution = static_cast<l_int32>(bigEndian32(body + 4) / 39.37 + 0.5);
+      layout->xResolution = dotsPerInch(bigEndian32(body));
+      layout->yResolution = dotsPerInch(bigEndian32(body + 4));
     } else if (is("tRNS") || (type[0] & 0x20) == 0) {
       return false;  // a transparency key, a palette or another critical chunk
     }
@@ -157,21 +157,14 @@ PIX* decodePNGWhole(const std::uint8_t* bytes, std::size_t size, std::uint32_t m
     return nullptr;
   }
 
-  int channels = layout.channels == 1 ? 1 : 4;  // in the bitmap: grey, or 32 bits
-  auto reduced = reducedSizeFor(layout.width, layout.height, maxLongSide);
-  PIX* pix = reduced ? createReduced(*reduced, channels, layout.xResolution, layout.yResolution)
-                     : createPagePix(layout.width, layout.height, channels * 8);
-  if (!pix) return nullptr;
-  if (!reduced) pixSetResolution(pix, layout.xResolution, layout.yResolution);
-  if (channels == 4) pixSetSpp(pix, layout.channels);
-  std::optional<RowReducer> reducer;
-  if (reduced) reducer.emplace(layout.width, layout.height, *reduced, channels, pix);
+  PictureBuilder picture(layout.width, layout.height, layout.channels == 1 ? 1 : 4,
+                         layout.channels == 4, maxLongSide, layout.xResolution, layout.yResolution);
+  if (!picture.ready()) return nullptr;
   std::vector<std::uint8_t> zeros(rowBytes, 0), rgba(layout.channels == 3 ? layout.width * 4 : 0);
   const std::uint8_t* prev = zeros.data();
   for (std::uint32_t y = 0; y < layout.height; ++y) {
     std::uint8_t* row = inflated.get() + y * (rowBytes + 1);
     if (!unfilter(row[0], row + 1, prev, rowBytes, static_cast<std::size_t>(layout.channels))) {
-      pixDestroy(&pix);
       return nullptr;
     }
     prev = ++row;
@@ -182,21 +175,9 @@ PIX* decodePNGWhole(const std::uint8_t* bytes, std::size_t size, std::uint32_t m
       }
       row = rgba.data();
     }
-    if (reducer) {
-      reducer->addRow(row);
-      continue;
-    }
-    // Leptonica keeps pixels in 32-bit words with the first pixel in the high byte.
-    l_uint32* line = pixGetData(pix) + static_cast<std::size_t>(y) * pixGetWpl(pix);
-    std::size_t words = channels == 4 ? layout.width : layout.width / 4;
-    for (std::size_t k = 0; k < words; ++k) line[k] = bigEndian32(row + k * 4);
-    if (channels == 1) {
-      for (std::uint32_t x = static_cast<std::uint32_t>(words * 4); x < layout.width; ++x) {
-        SET_DATA_BYTE(line, x, row[x]);
-      }
-    }
+    picture.addRow(row);
   }
-  return pix;
+  return picture.take();
 }
 
 }  // namespace corvel

@@ -111,30 +111,70 @@ void RowReducer::flush() {
   rowsInTarget_ = 0;
 }
 
-PIX* createReduced(ReducedSize size, int channels, int xResolution, int yResolution) {
-  PIX* out = createPagePix(size.width, size.height, channels == 1 ? 8 : 32);
-  if (!out) return nullptr;
-  if (channels == 4) pixSetSpp(out, 4);
-  pixSetResolution(out, static_cast<l_int32>(std::lround(xResolution * size.scale)),
-                   static_cast<l_int32>(std::lround(yResolution * size.scale)));
-  return out;
+namespace {
+
+std::uint32_t bigEndian32(const std::uint8_t* p) {
+  return (std::uint32_t{p[0]} << 24) | (std::uint32_t{p[1]} << 16) | (std::uint32_t{p[2]} << 8) |
+         p[3];
+}
+
+}  // namespace
+
+l_int32 dotsPerInch(std::uint32_t perMetre) { return static_cast<l_int32>(perMetre / 39.37 + 0.5); }
+
+PictureBuilder::PictureBuilder(std::uint32_t width, std::uint32_t height, int channels, bool alpha,
+                               std::uint32_t maxLongSide, l_int32 xResolution, l_int32 yResolution)
+    : width_(width), channels_(channels) {
+  auto reduced = reducedSizeFor(width, height, maxLongSide);
+  double scale = reduced ? reduced->scale : 1.0;
+  pix_ = reduced ? createPagePix(reduced->width, reduced->height, channels * 8)
+                 : createPagePix(width, height, channels * 8);
+  if (!pix_) return;
+  // The resolution follows the size.
+  pixSetResolution(pix_, static_cast<l_int32>(std::lround(xResolution * scale)),
+                   static_cast<l_int32>(std::lround(yResolution * scale)));
+  if (channels == 4) pixSetSpp(pix_, alpha ? 4 : 3);
+  if (reduced) reducer_.emplace(width, height, *reduced, channels, pix_);
+}
+
+PictureBuilder::~PictureBuilder() { pixDestroy(&pix_); }
+
+void PictureBuilder::addRow(const std::uint8_t* row) {
+  if (reducer_) {
+    reducer_->addRow(row);
+    return;
+  }
+  // Leptonica keeps pixels in 32-bit words with the first pixel in the high byte.
+  l_uint32* line =
+      pixGetData(pix_) + std::size_t{nextRow_++} * static_cast<std::size_t>(pixGetWpl(pix_));
+  std::uint32_t words = channels_ == 4 ? width_ : width_ / 4;
+  for (std::uint32_t k = 0; k < words; ++k) line[k] = bigEndian32(row + std::size_t{k} * 4);
+  if (channels_ == 1) {
+    for (std::uint32_t x = words * 4; x < width_; ++x) SET_DATA_BYTE(line, x, row[x]);
+  }
+}
+
+PIX* PictureBuilder::take() {
+  PIX* pix = pix_;
+  pix_ = nullptr;
+  return pix;
 }
 
 PIX* reducePix(PIX* pix, std::uint32_t maxLongSide) {
   auto width = static_cast<std::uint32_t>(pixGetWidth(pix));
   auto height = static_cast<std::uint32_t>(pixGetHeight(pix));
-  auto size = reducedSizeFor(width, height, maxLongSide);
   int depth = pixGetDepth(pix);
-  if (!size || (depth != 1 && depth != 8 && depth != 32)) return nullptr;
+  if (!reducedSizeFor(width, height, maxLongSide) || (depth != 1 && depth != 8 && depth != 32)) {
+    return nullptr;
+  }
   int channels = depth == 32 ? 4 : 1;
-  PIX* out = createReduced(*size, channels, pixGetXRes(pix), pixGetYRes(pix));
-  if (!out) return nullptr;
-  // Rows go to the reducer in PNG's byte order: grey a byte per pixel (bilevel pixels
-  // become black or white), colour as R, G, B, A.
-  RowReducer reducer(width, height, *size, channels, out);
-  std::vector<std::uint8_t> row(static_cast<std::size_t>(width) *
-                                static_cast<std::size_t>(channels));
   bool alpha = pixGetSpp(pix) == 4;
+  PictureBuilder builder(width, height, channels, alpha, maxLongSide, pixGetXRes(pix),
+                         pixGetYRes(pix));
+  if (!builder.ready()) return nullptr;
+  // Rows go to the builder in PNG's byte order: grey a byte per pixel (bilevel pixels
+  // become black or white), colour as R, G, B, A.
+  std::vector<std::uint8_t> row(std::size_t{width} * static_cast<std::size_t>(channels));
   for (std::uint32_t y = 0; y < height; ++y) {
     const l_uint32* line =
         pixGetData(pix) + static_cast<std::size_t>(y) * static_cast<std::size_t>(pixGetWpl(pix));
@@ -151,10 +191,9 @@ PIX* reducePix(PIX* pix, std::uint32_t maxLongSide) {
         p[3] = alpha ? static_cast<std::uint8_t>(line[x]) : 255;
       }
     }
-    reducer.addRow(row.data());
+    builder.addRow(row.data());
   }
-  if (channels == 4 && !alpha) pixSetSpp(out, 3);
-  return out;
+  return builder.take();
 }
 
 }  // namespace corvel

@@ -86,34 +86,5 @@ TEST(BaseEncode, Base64ChoosesImageThenContentsThenFile) {
   }
 }
 
-// An attachment whose picture and contents depend on its state, as the library's own
-// subclasses do: encoding must see the overrides.
-class ExportingPicture : public RVMXTextAttachment {
- public:
-  explicit ExportingPicture(Passkey k) : RVMXTextAttachment(k) {}
-  static std::shared_ptr<ExportingPicture> make() { return alloc<ExportingPicture>(); }
-  std::shared_ptr<Image> image() const override {
-    return saving() == kSavingTextExport ? nullptr : RVMXTextAttachment::image();
-  }
-  std::optional<Data> contents() const override { return Data{'o', 'k'}; }
-};
-
-TEST(BaseEncode, EncodingReadsThroughTheSubclassOverrides) {
-  auto a = ExportingPicture::make();
-  a->setImage(Image::initWithData(fixture("sample.png")));
-  auto asPicture = base64Decoding(text(*a->encodedBase64Data()));
-  ASSERT_TRUE(asPicture);
-  EXPECT_TRUE(isJPEG(*asPicture));
-  a->setSaving(kSavingTextExport);
-  EXPECT_EQ(text(*a->encodedBase64Data()), "b2s=");
-
-  // JPEG at 0.9: below the best quality, from the same pixels.
-  auto photo = Image::initWithData(fixture("sample.jpg"));
-  auto atNine = a->jpegDataForImage(photo);
-  ASSERT_TRUE(atNine && isJPEG(*atNine));
-  EXPECT_LT(atNine->size(), photo->jpegData(1.0)->size());
-  EXPECT_FALSE(a->jpegDataForImage(nullptr));
-}
-
 }  // namespace
 }  // namespace corvel

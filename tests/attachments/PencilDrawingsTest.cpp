@@ -1,5 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <regex>
+
 #include "Corvelbase/PencilDrawings.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/KeyedArchive.h"
@@ -16,12 +18,37 @@ std::shared_ptr<RVMXScaledImageAttachment> pictureAt(const AttributedString& tex
 
 using Attachment = std::shared_ptr<TextAttachment>;
 
-// A plain attachment whose wrapper has the given names, as a loaded text holds them.
 Attachment named(std::optional<std::string> preferred, std::optional<std::string> filename) {
-  auto wrapper = FileWrapper::initRegularFileWithContents({});
-  wrapper->setPreferredFilename(std::move(preferred));
-  wrapper->setFilename(std::move(filename));
-  return TextAttachment::initWithFileWrapper(wrapper);
+  return TextAttachment::initWithFileWrapper(testing::wrapperNamed(filename, preferred));
+}
+
+TEST(PencilAttachment, WritesItsBytesUnderAFreshUUIDAndHandsOutWhatSavingAsks) {
+  testing::ScopedCachesDirectory caches;
+  Data strokes = testing::makeStrokes(3000, 1);
+  auto drawing = RVPencilAttachment::initWithData(strokes, "public.data");
+  ASSERT_TRUE(drawing->uuid());
+  EXPECT_TRUE(
+      std::regex_match(*drawing->uuid(), std::regex("[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}")));
+  EXPECT_EQ(readFile(caches.file(*drawing->uuid() + ".pencildata")), strokes);  // as given
+  // Without data there is nothing to name or write.
+  auto empty = RVPencilAttachment::initWithData(std::nullopt, "public.data");
+  EXPECT_FALSE(empty->uuid() || empty->fw() || empty->strokeData());
+  EXPECT_EQ(caches.names().size(), 1u);
+
+  // Made with any type, a drawing is plain data.
+  drawing = RVPencilAttachment::initWithData(strokes, "com.example.ink");
+  const std::pair<std::int64_t, bool> cases[] = {
+      {0, false}, {1, true}, {2, false}, {-1, false}};  // saving, writing out
+  for (const auto& [saving, writingOut] : cases) {
+    drawing->setSaving(saving);
+    // The file only while written out, the contents only while not: never both.
+    EXPECT_EQ(drawing->fileWrapper(), writingOut ? drawing->fw() : nullptr) << saving;
+    EXPECT_EQ(drawing->contents(), writingOut ? std::nullopt : std::optional<Data>(strokes));
+    EXPECT_EQ(drawing->isPencilData(), writingOut) << saving;
+    // The strokes and the type never depend on the state or the creation.
+    EXPECT_EQ(drawing->strokeData(), strokes) << saving;
+    EXPECT_EQ(drawing->fileType(), "public.data") << saving;
+  }
 }
 
 TEST(PencilDrawings, CutAndCopyWriteOnlyWhatTheyHoldAndResetOnlyInsideTheText) {
@@ -33,7 +60,6 @@ TEST(PencilDrawings, CutAndCopyWriteOnlyWhatTheyHoldAndResetOnlyInsideTheText) {
   text.insertImage(testing::makePicture(8, 8), Data{4}, Range{4, 0});
   text.insertImage(testing::makePicture(8, 8), Data{5}, Range{9, 9});  // outside: nothing
   ASSERT_EQ(text.string(), u"a\uFFFCbc\uFFFC");
-  EXPECT_EQ(caches.names().size(), 4u);
   auto cut = pictureAt(text, 1), exported = pictureAt(text, 4);
 
   // While editing the pictures give no file, so no drawing can be keyed by it.
@@ -70,7 +96,6 @@ TEST(PencilDrawings, TheTwoIdentifiersDifferOnPreferredFilename) {
       {named("P.jpeg", "F.jpeg"), "P", "F"},
       {named(std::nullopt, "F.jpeg"), "F", "F"},
       {named("P.jpeg", std::nullopt), "P", std::nullopt},
-      {named(std::nullopt, std::nullopt), std::nullopt, std::nullopt},
       {named("a/b/Q.tar.gz", "/x/R.pencildata/"), "Q.tar", "R"},
       {named(".hidden", "noext"), ".hidden", "noext"},
       {TextAttachment::init(), std::nullopt, std::nullopt},  // no wrapper

@@ -62,6 +62,15 @@ inline Data makeStrokes(std::size_t size, std::uint32_t seed) {
   return bytes;
 }
 
+// A one-byte file wrapper with the given names, as a loaded text holds them.
+inline std::shared_ptr<FileWrapper> wrapperNamed(std::optional<std::string> filename,
+                                                 std::optional<std::string> preferred = {}) {
+  auto wrapper = FileWrapper::initRegularFileWithContents(Data{1});
+  wrapper->setFilename(std::move(filename));
+  wrapper->setPreferredFilename(std::move(preferred));
+  return wrapper;
+}
+
 // The size of the picture in `bytes`; the zero size when there is none.
 inline Size decodedSize(const std::optional<Data>& bytes) {
   auto image = bytes ? Image::initWithData(*bytes) : nullptr;

@@ -35,8 +35,6 @@ void expectEdits(const EditCase (&cases)[N], Command command = nullptr) {
 
 TEST(LinePrefix, TogglesThePrefixAndCarriesTheSelection) {
   const EditCase cases[] = {
-      {"adds to two lines", u"a\nb", {0, 3}, u"- a\n- b", {0, 3}, {0, 7}},
-      {"removes from two lines", u"- a\n- b", {0, 7}, u"a\nb", {0, 7}, {0, 3}},
       {"mixed lines each toggle", u"- a\nb", {0, 5}, u"a\n- b", {0, 5}, {0, 5}},
       {"CR LF lines", u"a\r\nb\r\n", {0, 6}, u"- a\r\n- b\r\n", {0, 6}, {0, 10}},
       {"empty line gets it", u"a\n\nb", {2, 0}, u"- \n", {2, 1}, {4, 0}},
@@ -45,8 +43,6 @@ TEST(LinePrefix, TogglesThePrefixAndCarriesTheSelection) {
       // The selection arithmetic, in coordinates of the text after the edit.
       {"caret at line start moves behind", u"abc", {0, 0}, u"- abc", {0, 3}, {2, 0}},
       {"caret mid-line keeps distance to end", u"abc", {2, 0}, u"- abc", {0, 3}, {4, 0}},
-      {"caret on second line", u"x\nabc", {3, 0}, u"- abc", {2, 3}, {5, 0}},
-      {"selection from line start grows", u"abc", {0, 2}, u"- abc", {0, 3}, {0, 4}},
       {"selection across lines", u"ab\ncd", {1, 3}, u"- ab\n- cd", {0, 5}, {3, 5}},
       {"end at a line end", u"ab\ncd\n", {0, 3}, u"- ab\n", {0, 3}, {0, 5}},
       // Removing: never before the line start, never a negative length.
@@ -58,19 +54,14 @@ TEST(LinePrefix, TogglesThePrefixAndCarriesTheSelection) {
       {"caret at very end", u"ab", {2, 0}, u"- ab", {0, 2}, {2, 0}},
       {"selection past the end", u"ab", {1, kMax}, u"- ab", {0, 2}, {3, 1}},
       // The named commands, with their own prefixes.
-      {"task", u"a", {0, 0}, u"- [ ] a", {0, 1}, {6, 0}, md::insertTaskList},
       {"task off", u"- [ ] a", {6, 0}, u"a", {0, 7}, {0, 0}, md::insertTaskList},
       {"half prefix", u"- [x] a", {0, 0}, u"- [ ] - [x] a", {0, 7}, {6, 0}, md::insertTaskList},
-      {"quote", u"a\nb", {2, 1}, u"> b", {2, 1}, {2, 3}, md::insertQuote},
   };
   expectEdits(cases);
 }
 
 TEST(LinePrefix, FirstLineOnlyCommands) {
   Range replaced = kUnwritten;
-  EXPECT_EQ(md::insertAtStartOfLine(u"a\nb\nc", u"> ", {0, 5}, true, &replaced, nullptr),
-            u"> a\nb\nc");
-  EXPECT_EQ(replaced, (Range{0, 5}));
   EXPECT_EQ(md::insertAtStartOfLine(u"a", u"", {0, 1}, false), u"a");  // empty prefix: no-op
   // The horizontal rule goes before the first line only.
   EXPECT_EQ(md::insertHorizontalLine(u"a\nb\nc", {0, 5}, &replaced), u"___\na\nb\nc");
@@ -86,14 +77,10 @@ TEST(NumberedList, RecognisesTheNumberPrefixAsICUDoes) {
     bool found;
     Range match;
   } cases[] = {
-      {u"12. x", true, {0, 4}},
-      {u"  3.  y", true, {0, 6}},
-      {u"1.\n", true, {0, 3}},             // "\s" takes the line feed
-      {u"\t\n1. a", true, {0, 5}},         // and leading line breaks
-      {u"\u0661\u0662. a", true, {0, 4}},  // Arabic-Indic digits are digits
-      {u"1.x", false, kUnwritten},
-      {u"x 1. y", false, kUnwritten},
-      {u"", false, kUnwritten},
+      {u"  3.  y", true, {0, 6}},         {u"1.\n", true, {0, 3}},  // "\s" takes the line feed
+      {u"\t\n1. a", true, {0, 5}},                                  // and leading line breaks
+      {u"\u0661\u0662. a", true, {0, 4}},  // several Arabic-Indic digits are digits
+      {u"1.x", false, kUnwritten},        {u"x 1. y", false, kUnwritten},
   };
   for (const Case& c : cases) {
     Range match = kUnwritten;
@@ -105,15 +92,11 @@ TEST(NumberedList, RecognisesTheNumberPrefixAsICUDoes) {
 
 TEST(NumberedList, NumbersRenumbersOrRemoves) {
   const EditCase cases[] = {
-      {"numbers lines", u"a\nb\nc", {0, 5}, u"1. a\n2. b\n3. c", {0, 5}, {0, 14}},
-      {"removes when first is numbered", u"1. a\n2. b", {0, 9}, u"a\nb", {0, 9}, {0, 3}},
       {"renumbers by place", u"x\n7. y", {0, 6}, u"1. x\n2. y", {0, 6}, {0, 9}},
       {"removing copies plain lines", u"1. a\nb", {0, 6}, u"a\nb", {0, 6}, {0, 3}},
-      {"numbers empty lines", u"a\n\nb", {0, 4}, u"1. a\n2. \n3. b", {0, 4}, {0, 13}},
       // A line that was only its number (the match took the feed) becomes "\n".
       {"number then feed", u"1.\nb", {0, 4}, u"\nb", {0, 4}, {0, 2}},
       {"number at text end", u"1. ", {0, 3}, u"\n", {0, 3}, {0, 1}},
-      {"caret at start", u"a", {0, 0}, u"1. a", {0, 1}, {3, 0}},
       {"caret after removed number", u"12. x", {4, 0}, u"x", {0, 5}, {0, 0}},
       {"empty document", u"", {0, 0}, u"1. ", {0, 0}, {0, 0}},
       {"past the end", u"a\n", {kMax, 5}, u"1. ", {2, 0}, {2, 0}},

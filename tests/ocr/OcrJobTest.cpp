@@ -415,7 +415,15 @@ TEST(OperationQueue, DestroyingAQueueDropsWaitingWorkAndReleasesIt) {
     queue->addOperationWithBlock([&ran, held] { ran = true; });
     held.reset();
     ASSERT_EQ(started.get_future().wait_for(10s), std::future_status::ready);
-    std::thread opener([&] { open.set_value(); });
+    // The running work may finish only once the waiting work has been dropped (its block,
+    // holding the last reference, is gone): otherwise the worker could start it first.
+    std::thread opener([&] {
+      auto deadline = std::chrono::steady_clock::now() + 10s;
+      while (!watch.expired() && std::chrono::steady_clock::now() < deadline) {
+        std::this_thread::yield();
+      }
+      open.set_value();
+    });
     queue.reset();
     opener.join();
   }

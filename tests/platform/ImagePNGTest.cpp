@@ -153,6 +153,37 @@ std::array<int, 4> expectedAt(const Spec& spec, int x, int y) {
   }
 }
 
+// The RGBA of the picture `spec` at `width` x `height`, reduced to fit `maxLongSide` when
+// that is smaller, computed pixel by pixel: each source pixel adds to the target pixel it
+// falls in.
+Data pixelsByDefinition(const Spec& spec, int width, int height, int maxLongSide) {
+  maxLongSide = std::min(maxLongSide, std::max(width, height));
+  double scale = static_cast<double>(maxLongSide) / std::max(width, height);
+  auto side = [&](int n) {
+    return std::clamp(static_cast<int>(std::floor(n * scale)), 1, maxLongSide);
+  };
+  int targetWidth = side(width), targetHeight = side(height);
+  std::vector<std::array<double, 5>> sums(static_cast<std::size_t>(targetWidth * targetHeight));
+  for (int y = 0; y < height; ++y) {
+    for (int x = 0; x < width; ++x) {
+      auto& sum = sums[static_cast<std::size_t>((y * targetHeight / height) * targetWidth +
+                                                x * targetWidth / width)];
+      auto pixel = expectedAt(spec, x, y);
+      for (int c = 0; c < 4; ++c)
+        sum[static_cast<std::size_t>(c)] += pixel[static_cast<std::size_t>(c)];
+      sum[4] += 1;
+    }
+  }
+  Data out;
+  for (const auto& sum : sums) {
+    for (int c = 0; c < 4; ++c) {
+      out.push_back(
+          static_cast<std::uint8_t>(std::floor(sum[static_cast<std::size_t>(c)] / sum[4] + 0.5)));
+    }
+  }
+  return out;
+}
+
 TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
   const Spec specs[] = {
       {"grey 1", PNG_COLOR_TYPE_GRAY, 1},
@@ -160,7 +191,6 @@ TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
       {"grey 1 keyed", PNG_COLOR_TYPE_GRAY, 1, false, true},
       {"grey 2", PNG_COLOR_TYPE_GRAY, 2},
       {"grey 4 interlaced", PNG_COLOR_TYPE_GRAY, 4, true},
-      {"grey 8", PNG_COLOR_TYPE_GRAY, 8},
       {"grey 8 interlaced", PNG_COLOR_TYPE_GRAY, 8, true},
       {"grey 8 keyed", PNG_COLOR_TYPE_GRAY, 8, false, true},
       {"grey 16", PNG_COLOR_TYPE_GRAY, 16},
@@ -169,7 +199,6 @@ TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
       {"rgb 8", PNG_COLOR_TYPE_RGB, 8},
       {"rgb 8 interlaced keyed", PNG_COLOR_TYPE_RGB, 8, true, true},
       {"rgb 16", PNG_COLOR_TYPE_RGB, 16},
-      {"rgba 8", PNG_COLOR_TYPE_RGB_ALPHA, 8},
       {"rgba 16 interlaced", PNG_COLOR_TYPE_RGB_ALPHA, 16, true},
       {"palette 2", PNG_COLOR_TYPE_PALETTE, 2},
       {"palette 4 interlaced", PNG_COLOR_TYPE_PALETTE, 4, true},
@@ -185,28 +214,10 @@ TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
   };
   for (const auto& spec : specs) {
     SCOPED_TRACE(spec.name);
-    Data png = writePng(spec);
-    ASSERT_FALSE(png.empty());
-    auto image = Image::initWithData(png);
+    auto image = Image::initWithData(writePng(spec));
     ASSERT_TRUE(image);
-    auto bitmap = image->bitmap();
-    ASSERT_EQ(bitmap->width(), static_cast<std::uint32_t>(kWidth));
-    ASSERT_EQ(bitmap->height(), static_cast<std::uint32_t>(kHeight));
-    Data rgba = bitmap->rgba();
-    int wrong = 0;
-    for (int y = 0; y < kHeight; ++y) {
-      for (int x = 0; x < kWidth; ++x) {
-        const std::uint8_t* got = &rgba[static_cast<std::size_t>(y * kWidth + x) * 4];
-        auto want = expectedAt(spec, x, y);
-        if (std::equal(want.begin(), want.end(), got, [](int w, std::uint8_t g) { return w == g; }))
-          continue;
-        if (++wrong <= 3) {
-          ADD_FAILURE() << "(" << x << ", " << y << "): got " << int(got[0]) << " " << int(got[1])
-                        << " " << int(got[2]) << " " << int(got[3]) << ", want " << want[0] << " "
-                        << want[1] << " " << want[2] << " " << want[3];
-        }
-      }
-    }
+    EXPECT_EQ(image->size(), (Size{kWidth, kHeight}));
+    EXPECT_EQ(image->bitmap()->rgba(), pixelsByDefinition(spec, kWidth, kHeight, kWidth));
   }
 }
 
@@ -232,35 +243,6 @@ TEST(ImagePNG, DamagedDataIsRefusedWithLibpngsReason) {
     EXPECT_EQ(::testing::internal::GetCapturedStderr(), "") << c.name;  // libpng printed nothing
     EXPECT_FALSE(image) << c.name;
   }
-}
-
-// The picture `spec` at `width` x `height` reduced to fit `maxLongSide`, computed pixel
-// by pixel: each source pixel adds to the target pixel it falls in.
-Data reducedByDefinition(const Spec& spec, int width, int height, int maxLongSide) {
-  double scale = static_cast<double>(maxLongSide) / std::max(width, height);
-  auto side = [&](int n) {
-    return std::clamp(static_cast<int>(std::floor(n * scale)), 1, maxLongSide);
-  };
-  int targetWidth = side(width), targetHeight = side(height);
-  std::vector<std::array<double, 5>> sums(static_cast<std::size_t>(targetWidth * targetHeight));
-  for (int y = 0; y < height; ++y) {
-    for (int x = 0; x < width; ++x) {
-      auto& sum = sums[static_cast<std::size_t>((y * targetHeight / height) * targetWidth +
-                                                x * targetWidth / width)];
-      auto pixel = expectedAt(spec, x, y);
-      for (int c = 0; c < 4; ++c)
-        sum[static_cast<std::size_t>(c)] += pixel[static_cast<std::size_t>(c)];
-      sum[4] += 1;
-    }
-  }
-  Data out;
-  for (const auto& sum : sums) {
-    for (int c = 0; c < 4; ++c) {
-      out.push_back(
-          static_cast<std::uint8_t>(std::floor(sum[static_cast<std::size_t>(c)] / sum[4] + 0.5)));
-    }
-  }
-  return out;
 }
 
 TEST(ImageReduce, ReducedPixelsAreTheMeansOfTheBlocksTheyCover) {
@@ -292,7 +274,7 @@ TEST(ImageReduce, ReducedPixelsAreTheMeansOfTheBlocksTheyCover) {
       auto afterDecoding = Image::initWithData(png)->bitmapFittingLongSide(
           static_cast<std::uint32_t>(size.maxLongSide));
       ASSERT_TRUE(whileDecoding && afterDecoding);
-      Data expected = reducedByDefinition(spec, size.width, size.height, size.maxLongSide);
+      Data expected = pixelsByDefinition(spec, size.width, size.height, size.maxLongSide);
       EXPECT_EQ(whileDecoding->rgba(), expected);
       EXPECT_EQ(afterDecoding->rgba(), expected);
       EXPECT_EQ(referenced->size(),

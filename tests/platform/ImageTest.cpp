@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
-#include <filesystem>
+#include <algorithm>
+#include <regex>
 
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Image.h"
@@ -28,27 +29,22 @@ TEST(Image, DecodesEveryFormatWithItsPixels) {
         Image::initByReferencingFile(testing::fixturePath(std::string("images/") + c.file));
     auto bitmap = image->bitmap();
     ASSERT_TRUE(bitmap) << c.file << ": " << image->failureReason();
-    EXPECT_EQ(image->failureReason(), "");
     EXPECT_EQ(image->size(), (Size{24, 16})) << c.file;
     Data rgba = bitmap->rgba();
     ASSERT_EQ(rgba.size(), 24u * 16 * 4);
-    // Pixel (x=20, y=10): red 200, green 150, blue 0.
-    const std::uint8_t* p = &rgba[(10 * 24 + 20) * 4];
-    int tolerance = c.lossless ? 0 : 24;
-    EXPECT_NEAR(p[0], 200, tolerance) << c.file;
-    EXPECT_NEAR(p[1], 150, tolerance) << c.file;
-    EXPECT_NEAR(p[2], 0, tolerance) << c.file;
-    EXPECT_EQ(p[3], 255) << c.file;
+    // Pixel (x=20, y=10): red 200, green 150, blue 0, opaque.
+    const int expected[] = {200, 150, 0, 255};
+    for (int k = 0; k < 4; ++k)
+      EXPECT_NEAR(rgba[(10 * 24 + 20) * 4 + k], expected[k], c.lossless || k == 3 ? 0 : 24)
+          << c.file << " channel " << k;
   }
 }
 
 TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
   Data png = fixtureBytes("sample.png");
   Data truncated(png.begin(), png.begin() + static_cast<long>(png.size() / 2));
-  Data jpeg = fixtureBytes("sample.jpg");
-  Data corrupt = jpeg;
-  for (std::size_t i = 200; i < corrupt.size(); ++i) corrupt[i] = 0x5a;
-  std::string text = "just some text, not an image";
+  Data corrupt = fixtureBytes("sample.jpg");
+  std::fill(corrupt.begin() + 200, corrupt.end(), 0x5a);
   // A PNG whose header claims 30000 x 30000 pixels.
   Data huge = png;
   huge[16] = 0, huge[17] = 0, huge[18] = 0x75, huge[19] = 0x30;
@@ -58,7 +54,6 @@ TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
     Data bytes;
     const char* reasonWord;
   } cases[] = {{"empty", {}, "not an image"},
-               {"text", Data(text.begin(), text.end()), "not an image"},
                {"truncated png", truncated, "corrupt or truncated"},
                {"huge png", huge, "too large"}};
   testing::TempDir dir;
@@ -76,56 +71,45 @@ TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
   }
   // A JPEG with garbage after its header decodes to something or fails; never crashes.
   auto damaged = Image::initWithData(corrupt);
-  if (damaged) {
-    EXPECT_EQ(damaged->size(), (Size{24, 16}));
-  }
+  EXPECT_TRUE(!damaged || damaged->size() == (Size{24, 16}));
   auto missing = Image::initByReferencingFile(dir.file("missing.png"));
   EXPECT_FALSE(missing->bitmap());
   EXPECT_NE(missing->failureReason().find("cannot be read"), std::string::npos);
-  auto directory = Image::initByReferencingFile(dir.path());
-  EXPECT_FALSE(directory->bitmap());
+  EXPECT_FALSE(Image::initByReferencingFile(dir.path())->bitmap());
 }
 
 TEST(Image, FileURLsAreReadAndOtherSchemesRefused) {
   std::string path = testing::fixturePath("images/sample.png");
-  std::string escaped = path;
-  for (std::size_t i = escaped.find('/', 1); i != std::string::npos; i = escaped.find('/', i + 3)) {
-    escaped.replace(i, 1, "%2F");
-  }
-  for (const std::string& url : {"file://" + path, "file:" + path, "FILE://localhost" + path,
-                                 "file:///" + escaped.substr(1)}) {
+  std::string escaped = std::regex_replace(path.substr(1), std::regex("/"), "%2F");
+  for (const std::string& url :
+       {"file://" + path, "file:" + path, "FILE://localhost" + path, "file:///" + escaped}) {
     auto image = Image::initByReferencingURL(url);
     EXPECT_TRUE(image->bitmap()) << url << ": " << image->failureReason();
   }
-  struct Refused {
-    std::string url;
-    const char* reasonWord;
-  } refused[] = {{"https://example.com/a.png", "https"},
-                 {"file://otherhost" + path, "another host"},
-                 {"file://", "names no file"},
-                 {"no-scheme.png", "not a URL"}};
-  for (const auto& r : refused) {
-    auto image = Image::initByReferencingURL(r.url);
-    EXPECT_FALSE(image->bitmap()) << r.url;
-    EXPECT_NE(image->failureReason().find(r.reasonWord), std::string::npos)
-        << r.url << ": " << image->failureReason();
+  const std::pair<std::string, const char*> refused[] = {
+      {"https://example.com/a.png", "https"},
+      {"file://otherhost" + path, "another host"},
+      {"file://", "names no file"},
+      {"no-scheme.png", "not a URL"}};
+  for (const auto& [url, reasonWord] : refused) {
+    auto image = Image::initByReferencingURL(url);
+    EXPECT_FALSE(image->bitmap()) << url;
+    EXPECT_NE(image->failureReason().find(reasonWord), std::string::npos)
+        << url << ": " << image->failureReason();
   }
 }
 
 TEST(Image, JpegEncodingRoundTripsAndComposesAlphaOverWhite) {
   constexpr std::uint32_t kSide = 32;
-  Data rgba(kSide * kSide * 4, 0);
-  for (std::size_t i = 0; i < rgba.size(); i += 4) {
-    rgba[i] = 10, rgba[i + 1] = 200, rgba[i + 2] = 30, rgba[i + 3] = 255;
-  }
-  for (std::size_t i = 0; i < kSide * 8 * 4; i += 4) rgba[i + 3] = 0;  // top 8 rows transparent
+  Data rgba;
+  for (std::size_t i = 0; i < kSide * kSide; ++i)  // the top 8 rows transparent
+    rgba.insert(rgba.end(), {10, 200, 30, std::uint8_t(i < kSide * 8 ? 0 : 255)});
   auto bitmap = Bitmap::fromRGBA(kSide, kSide, rgba.data(), rgba.size());
   ASSERT_TRUE(bitmap);
   auto image = Image::initWithBitmap(bitmap);
   auto best = image->jpegData(1.0), worst = image->jpegData(0.0), odd = image->jpegData(-5);
   ASSERT_TRUE(best && worst && odd);
-  EXPECT_EQ((*best)[0], 0xFF);
-  EXPECT_EQ((*best)[1], 0xD8);
+  EXPECT_LT(worst->size(), best->size());
   EXPECT_EQ(*odd, *worst);  // out-of-range factors clamp
   auto decoded = Image::initWithData(*best);
   ASSERT_TRUE(decoded);

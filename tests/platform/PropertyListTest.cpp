@@ -2,29 +2,26 @@
 
 #include <cstdlib>
 #include <filesystem>
+#include <regex>
 
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
-#include "Corvelbase/platform/Log.h"
-#include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/PropertyList.h"
 #include "support/TestSupport.h"
 
 namespace corvel {
 namespace {
 
+// Every kind of value, nested, with text outside the BMP.
 PropertyList sampleTree() {
   PropertyList::Dictionary child{{"text", u"caf\u00e9 \U0001F600"},
                                  {"confidence", 0.25},
                                  {"level", std::uint64_t{2}},
-                                 {"childBlocks", PropertyList::Array{}}};
-  return PropertyList::Dictionary{
-      {"text", u"column"},
-      {"flag", true},
-      {"bytes", Data{0, 1, 2, 255}},
-      {"uid", PropertyList::Uid{7}},
-      {"childBlocks", PropertyList::Array{child, child}},
-  };
+                                 {"empty", PropertyList::Array{}}};
+  return PropertyList::Dictionary{{"flag", true},
+                                  {"bytes", Data{0, 1, 2, 255}},
+                                  {"uid", PropertyList::Uid{7}},
+                                  {"children", PropertyList::Array{child, child}}};
 }
 
 TEST(PropertyList, RoundTripsThroughBinaryAndXML) {
@@ -43,14 +40,11 @@ TEST(PropertyList, RoundTripsThroughBinaryAndXML) {
 }
 
 TEST(PropertyList, RejectsWhatIsNoPropertyList) {
-  EXPECT_FALSE(PropertyList::deserialize(Data{}));
   std::string junk = "not a plist at all";
   EXPECT_FALSE(PropertyList::deserialize(Data(junk.begin(), junk.end())));
   auto binary = sampleTree().serialize(PropertyList::Format::Binary);
-  for (std::size_t cut : {std::size_t{8}, binary->size() / 2, binary->size() - 1}) {
-    Data truncated(binary->begin(), binary->begin() + static_cast<long>(cut));
-    EXPECT_FALSE(PropertyList::deserialize(truncated)) << "cut at " << cut;
-  }
+  for (std::size_t cut : {std::size_t{0}, std::size_t{8}, binary->size() / 2, binary->size() - 1})
+    EXPECT_FALSE(PropertyList::deserialize(Data(binary->begin(), binary->begin() + cut))) << cut;
   EXPECT_FALSE(PropertyList().serialize(PropertyList::Format::XML));
 }
 
@@ -61,7 +55,6 @@ TEST(PropertyList, NumberConversionsFollowThePlatformsNumbers) {
   EXPECT_EQ(PropertyList(Data{1}).doubleValue(), 0);
   EXPECT_EQ(PropertyList(std::numeric_limits<double>::quiet_NaN()).unsignedIntValue(), 0u);
   EXPECT_EQ(PropertyList(1e300).unsignedIntegerValue(), UINT64_MAX);
-  EXPECT_EQ(PropertyList(std::int64_t{-3}).integerValue(), -3);
 }
 
 TEST(PropertyList, FilesAreWrittenWholeAndReadBack) {
@@ -77,6 +70,7 @@ TEST(PropertyList, FilesAreWrittenWholeAndReadBack) {
   EXPECT_EQ(std::distance(std::filesystem::directory_iterator(dir.path()), {}), 1);
 }
 
+// A host's own caches directory is walked by the drawings' tests.
 TEST(Files, CachesDirectoryFollowsTheEnvironmentAndIsCreated) {
   testing::TempDir dir;
   std::string xdg = dir.file("xdg");
@@ -87,44 +81,28 @@ TEST(Files, CachesDirectoryFollowsTheEnvironmentAndIsCreated) {
   std::string home = dir.file("home");
   setenv("HOME", home.c_str(), 1);
   EXPECT_EQ(cachesDirectory(), home + "/.cache");
-  PlatformRegistry::setCachesDirectory(dir.file("override"));
-  EXPECT_EQ(cachesDirectory(), dir.file("override"));
-  PlatformRegistry::setCachesDirectory(std::nullopt);
   unsetenv("XDG_CACHE_HOME");
 }
 
 TEST(Files, UUIDsAreCanonicalUpperCaseAndDistinct) {
-  std::string a = makeUUIDString(), b = makeUUIDString();
-  EXPECT_NE(a, b);
-  ASSERT_EQ(a.size(), 36u);
-  for (std::size_t i = 0; i < a.size(); ++i) {
-    if (i == 8 || i == 13 || i == 18 || i == 23) {
-      EXPECT_EQ(a[i], '-');
-    } else {
-      EXPECT_TRUE(std::isdigit(a[i]) || (a[i] >= 'A' && a[i] <= 'F')) << a;
-    }
-  }
+  std::string a = makeUUIDString();
+  EXPECT_TRUE(std::regex_match(a, std::regex("[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}"))) << a;
+  EXPECT_NE(a, makeUUIDString());
 }
 
 TEST(Strings, ConversionsReplaceWhatIsNotUnicode) {
-  EXPECT_EQ(toUTF8(u"a\U0001F600b"),
-            "a\xF0\x9F\x98\x80"
-            "b");
+  EXPECT_EQ(toUTF8(u"a\U0001F600z"), "a\xF0\x9F\x98\x80z");
+  EXPECT_EQ(fromUTF8("a\xF0\x9F\x98\x80z"), u"a\U0001F600z");
   EXPECT_EQ(toUTF8(String{u'x', 0xD800, u'y'}), "x\xEF\xBF\xBDy");
-  EXPECT_EQ(fromUTF8("a\xFF"
-                     "b"),
-            (String{u'a', 0xFFFD, u'b'}));
-  EXPECT_EQ(fromUTF8("\xF0\x9F\x98\x80"), u"\U0001F600");
+  EXPECT_EQ(fromUTF8("a\xFFz"), (String{u'a', 0xFFFD, u'z'}));
 }
 
-TEST(ErrorAndLog, DescriptionAndSink) {
+// Hosts match on this text in their logs; what reaches the log sink is checked where
+// errors are logged.
+TEST(Error, DescriptionHasThePlatformsForm) {
   Error error{"com.example", 200, {{"Error reason", u"broken"}}};
   EXPECT_EQ(error.description(),
             "Error Domain=com.example Code=200 \"(null)\" UserInfo={Error reason=broken}");
-  EXPECT_EQ(error.userInfoString("Error reason"), "broken");
-  testing::LogCapture capture;
-  logMessage("Error: something");
-  EXPECT_EQ(capture.lines(), std::vector<std::string>{"Error: something"});
 }
 
 }  // namespace

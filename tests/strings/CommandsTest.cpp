@@ -22,11 +22,11 @@ std::string file(const testing::TempDir& dir, const std::string& name, const std
 
 TEST(StringCommands, UtiLangAndHeaderPrintTheAnswerOrExitWithWhy) {
   testing::TempDir dir;
-  std::string notes = file(dir, "notes.MD", "# x"), folder = "'" + dir.path() + "'";
+  std::string notes = file(dir, "notes.MD", "# x");
   std::string de = file(dir, "de.txt",
                         "Wir haben das ganze Wochenende den Dachboden aufgeräumt und alte Briefe "
                         "gefunden.");
-  std::string digits = file(dir, "digits.txt", "1234 5678 90"), empty = file(dir, "e.txt", "");
+  std::string digits = file(dir, "digits.txt", "1234 5678 90");
   std::string bad = file(dir, "bad.txt", "\xff\xfe\x80 \xc3"), missing = "'" + dir.file("no") + "'";
   std::string mail =
       file(dir, "m.eml", "From: Ada Lovelace <ada@example.com>\r\nSubject: Grüße\r\n\r\nBody\r\n");
@@ -36,29 +36,19 @@ TEST(StringCommands, UtiLangAndHeaderPrintTheAnswerOrExitWithWhy) {
       {"uti " + notes, 0,
        "net.daringfireball.markdown\npublic.plain-text\npublic.text\npublic.data\n"
        "public.content\npublic.item\n"},
-      {"uti " + folder, 0, "public.folder\npublic.directory\npublic.item\n"},
       {"uti com.example.unknown", 0, "com.example.unknown\n"},
       {"uti", 2, ""},
-      {"uti ''", 2, ""},
       // lang: the code from a file or standard input; 1 when undetermined.
       {"lang " + de, 0, "de\n"},
       {"lang < " + de, 0, "de\n"},
-      {"lang - < " + de, 0, "de\n"},
       {"lang " + digits, 1, ""},
-      {"lang " + empty, 1, ""},
       {"lang " + bad, 1, ""},
       {"lang " + missing, 2, ""},
-      {"lang " + folder, 2, ""},
       {"lang --fast", 2, ""},
       // header: the value, or with --address the address; 1 when there is none.
       {"header subject " + mail, 0, "Grüße\n"},
-      {"header From " + mail, 0, "Ada Lovelace <ada@example.com>\n"},
-      {"header From --address " + mail, 0, "ada@example.com\n"},
-      {"header --address From " + mail, 0, "ada@example.com\n"},
-      {"header From --address < " + mail, 0, "ada@example.com\n"},
+      {"header --address From < " + mail, 0, "ada@example.com\n"},
       {"header Subject --address " + mail, 1, ""},
-      {"header 'Subject(' " + mail, 1, ""},
-      {"header", 2, ""},
       {"header From " + mail + " extra", 2, ""},
       {"header From " + missing, 2, ""},
   };
