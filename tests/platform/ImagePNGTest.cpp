@@ -22,7 +22,7 @@ namespace {
 // 11 x 7 crosses every Adam7 pass boundary.
 constexpr int kWidth = 11, kHeight = 7;
 
-struct Spec {
+struct Variant {
   const char* name;
   int colorType;
   int bitDepth;
@@ -59,7 +59,7 @@ png_color paletteEntry(int i) {
           static_cast<png_byte>(i * 3)};
 }
 
-Data writePng(const Spec& spec, int width = kWidth, int height = kHeight) {
+Data writePng(const Variant& variant, int width = kWidth, int height = kHeight) {
   Data out;
   png_structp png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
   png_infop info = png_create_info_struct(png);
@@ -69,35 +69,35 @@ Data writePng(const Spec& spec, int width = kWidth, int height = kHeight) {
   }
   png_set_write_fn(png, &out, appendBytes, nullptr);
   png_set_IHDR(png, info, static_cast<png_uint_32>(width), static_cast<png_uint_32>(height),
-               spec.bitDepth, spec.colorType,
-               spec.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
+               variant.bitDepth, variant.colorType,
+               variant.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
                PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
   png_color palette[256];
   for (int i = 0; i < 256; ++i) palette[i] = paletteEntry(i);
-  if (spec.colorType == PNG_COLOR_TYPE_PALETTE)
-    png_set_PLTE(png, info, palette, 1 << spec.bitDepth);
+  if (variant.colorType == PNG_COLOR_TYPE_PALETTE)
+    png_set_PLTE(png, info, palette, 1 << variant.bitDepth);
   png_byte opaqueAfterFirst[1] = {0};  // palette entry 0 transparent
   png_color_16 key{};                  // the colour of pixel (0, 0) transparent
-  key.gray = static_cast<png_uint_16>(sampleAt(0, 0, 0, spec.bitDepth));
+  key.gray = static_cast<png_uint_16>(sampleAt(0, 0, 0, variant.bitDepth));
   key.red = key.gray;
-  key.green = static_cast<png_uint_16>(sampleAt(0, 0, 1, spec.bitDepth));
-  key.blue = static_cast<png_uint_16>(sampleAt(0, 0, 2, spec.bitDepth));
-  if (spec.transparentKey) png_set_tRNS(png, info, opaqueAfterFirst, 1, &key);
+  key.green = static_cast<png_uint_16>(sampleAt(0, 0, 1, variant.bitDepth));
+  key.blue = static_cast<png_uint_16>(sampleAt(0, 0, 2, variant.bitDepth));
+  if (variant.transparentKey) png_set_tRNS(png, info, opaqueAfterFirst, 1, &key);
   png_set_pHYs(png, info, 11811, 11811, PNG_RESOLUTION_METER);  // 300 dpi
-  if (spec.filter) {
-    png_set_filter(png, PNG_FILTER_TYPE_BASE, spec.filter);
+  if (variant.filter) {
+    png_set_filter(png, PNG_FILTER_TYPE_BASE, variant.filter);
     png_set_compression_buffer_size(png, 32);
   }
   png_write_info(png, info);
-  if (spec.bitDepth < 8) png_set_packing(png);  // rows below hold a sample per byte
-  int channels = png_get_channels(png, info);   // a palette index counts as one
-  int bytesPerSample = spec.bitDepth == 16 ? 2 : 1;
+  if (variant.bitDepth < 8) png_set_packing(png);  // rows below hold a sample per byte
+  int channels = png_get_channels(png, info);      // a palette index counts as one
+  int bytesPerSample = variant.bitDepth == 16 ? 2 : 1;
   std::vector<std::vector<png_byte>> rows(static_cast<std::size_t>(height));
   std::vector<png_bytep> pointers;
   for (int y = 0; y < height; ++y) {
     for (int x = 0; x < width; ++x) {
       for (int c = 0; c < channels; ++c) {
-        int sample = sampleAt(x, y, c, spec.bitDepth);
+        int sample = sampleAt(x, y, c, variant.bitDepth);
         if (bytesPerSample == 2)
           rows[static_cast<std::size_t>(y)].push_back(static_cast<png_byte>(sample >> 8));
         rows[static_cast<std::size_t>(y)].push_back(static_cast<png_byte>(sample & 0xff));
@@ -112,38 +112,38 @@ Data writePng(const Spec& spec, int width = kWidth, int height = kHeight) {
 }
 
 // The RGBA the reader must produce at (x, y).
-std::array<int, 4> expectedAt(const Spec& spec, int x, int y) {
-  auto s = [&](int c) { return sampleAt(x, y, c, spec.bitDepth); };
+std::array<int, 4> expectedAt(const Variant& variant, int x, int y) {
+  auto s = [&](int c) { return sampleAt(x, y, c, variant.bitDepth); };
   // The key makes every pixel of the colour of (0, 0) transparent.
-  auto first = [&](int c) { return sampleAt(0, 0, c, spec.bitDepth); };
-  bool keyed = spec.transparentKey && s(0) == first(0) &&
-               (spec.colorType == PNG_COLOR_TYPE_GRAY || (s(1) == first(1) && s(2) == first(2)));
-  switch (spec.colorType) {
+  auto first = [&](int c) { return sampleAt(0, 0, c, variant.bitDepth); };
+  bool keyed = variant.transparentKey && s(0) == first(0) &&
+               (variant.colorType == PNG_COLOR_TYPE_GRAY || (s(1) == first(1) && s(2) == first(2)));
+  switch (variant.colorType) {
     case PNG_COLOR_TYPE_PALETTE: {
       png_color entry = paletteEntry(s(0));
-      return {entry.red, entry.green, entry.blue, spec.transparentKey && s(0) == 0 ? 0 : 255};
+      return {entry.red, entry.green, entry.blue, variant.transparentKey && s(0) == 0 ? 0 : 255};
     }
     case PNG_COLOR_TYPE_GRAY: {
-      int grey = toEight(s(0), spec.bitDepth);
+      int grey = toEight(s(0), variant.bitDepth);
       return {grey, grey, grey, keyed ? 0 : 255};
     }
     case PNG_COLOR_TYPE_GRAY_ALPHA: {
-      int grey = toEight(s(0), spec.bitDepth);
-      return {grey, grey, grey, toEight(s(1), spec.bitDepth)};
+      int grey = toEight(s(0), variant.bitDepth);
+      return {grey, grey, grey, toEight(s(1), variant.bitDepth)};
     }
     case PNG_COLOR_TYPE_RGB:
-      return {toEight(s(0), spec.bitDepth), toEight(s(1), spec.bitDepth),
-              toEight(s(2), spec.bitDepth), keyed ? 0 : 255};
+      return {toEight(s(0), variant.bitDepth), toEight(s(1), variant.bitDepth),
+              toEight(s(2), variant.bitDepth), keyed ? 0 : 255};
     default:
-      return {toEight(s(0), spec.bitDepth), toEight(s(1), spec.bitDepth),
-              toEight(s(2), spec.bitDepth), toEight(s(3), spec.bitDepth)};
+      return {toEight(s(0), variant.bitDepth), toEight(s(1), variant.bitDepth),
+              toEight(s(2), variant.bitDepth), toEight(s(3), variant.bitDepth)};
   }
 }
 
-// The RGBA of the picture `spec` at `width` x `height`, reduced to fit `maxLongSide` when
+// The RGBA of the picture `variant` at `width` x `height`, reduced to fit `maxLongSide` when
 // that is smaller, computed pixel by pixel: each source pixel adds to the target pixel it
 // falls in.
-Data pixelsByDefinition(const Spec& spec, int width, int height, int maxLongSide) {
+Data pixelsByDefinition(const Variant& variant, int width, int height, int maxLongSide) {
   maxLongSide = std::min(maxLongSide, std::max(width, height));
   double scale = static_cast<double>(maxLongSide) / std::max(width, height);
   auto side = [&](int n) {
@@ -155,7 +155,7 @@ Data pixelsByDefinition(const Spec& spec, int width, int height, int maxLongSide
     for (int x = 0; x < width; ++x) {
       auto& sum = sums[static_cast<std::size_t>((y * targetHeight / height) * targetWidth +
                                                 x * targetWidth / width)];
-      auto pixel = expectedAt(spec, x, y);
+      auto pixel = expectedAt(variant, x, y);
       for (int c = 0; c < 4; ++c)
         sum[static_cast<std::size_t>(c)] += pixel[static_cast<std::size_t>(c)];
       sum[4] += 1;
@@ -172,7 +172,7 @@ Data pixelsByDefinition(const Spec& spec, int width, int height, int maxLongSide
 }
 
 TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
-  const Spec specs[] = {
+  const Variant variants[] = {
       {"grey 1", PNG_COLOR_TYPE_GRAY, 1},
       {"grey 1 interlaced", PNG_COLOR_TYPE_GRAY, 1, true},
       {"grey 1 keyed", PNG_COLOR_TYPE_GRAY, 1, false, true},
@@ -196,12 +196,12 @@ TEST(ImagePNG, EveryColourTypeDepthAndInterlacingDecodesToItsPixels) {
       {"rgb 8 paeth", PNG_COLOR_TYPE_RGB, 8, false, false, PNG_FILTER_PAETH},
       {"rgba 8 sub", PNG_COLOR_TYPE_RGB_ALPHA, 8, false, false, PNG_FILTER_SUB},
   };
-  for (const auto& spec : specs) {
-    SCOPED_TRACE(spec.name);
-    auto image = Image::initWithData(writePng(spec));
+  for (const auto& variant : variants) {
+    SCOPED_TRACE(variant.name);
+    auto image = Image::initWithData(writePng(variant));
     ASSERT_TRUE(image);
     EXPECT_EQ(image->size(), (Size{kWidth, kHeight}));
-    EXPECT_EQ(image->bitmap()->rgba(), pixelsByDefinition(spec, kWidth, kHeight, kWidth));
+    EXPECT_EQ(image->bitmap()->rgba(), pixelsByDefinition(variant, kWidth, kHeight, kWidth));
   }
 }
 
@@ -230,7 +230,7 @@ TEST(ImagePNG, DamagedDataIsRefusedWithLibpngsReason) {
 }
 
 TEST(ImageReduce, ReducedPixelsAreTheMeansOfTheBlocksTheyCover) {
-  const Spec specs[] = {
+  const Variant variants[] = {
       {"grey 1", PNG_COLOR_TYPE_GRAY, 1},
       {"grey 8", PNG_COLOR_TYPE_GRAY, 8},
       {"grey 16", PNG_COLOR_TYPE_GRAY, 16},
@@ -244,11 +244,11 @@ TEST(ImageReduce, ReducedPixelsAreTheMeansOfTheBlocksTheyCover) {
     int width, height, maxLongSide;
   } sizes[] = {{37, 23, 10}, {23, 37, 30}, {300, 3, 100}, {9, 9, 8}};
   testing::TempDir dir;
-  for (const auto& spec : specs) {
+  for (const auto& variant : variants) {
     for (const auto& size : sizes) {
-      SCOPED_TRACE(std::string(spec.name) + " " + std::to_string(size.width) + "x" +
+      SCOPED_TRACE(std::string(variant.name) + " " + std::to_string(size.width) + "x" +
                    std::to_string(size.height) + " to " + std::to_string(size.maxLongSide));
-      Data png = writePng(spec, size.width, size.height);
+      Data png = writePng(variant, size.width, size.height);
       std::string path = dir.file("reduce.png");
       ASSERT_TRUE(writeFileAtomically(path, png));
       // Reduced while decoded (rows straight from the file) and after decoding whole.
@@ -258,7 +258,7 @@ TEST(ImageReduce, ReducedPixelsAreTheMeansOfTheBlocksTheyCover) {
       auto afterDecoding = Image::initWithData(png)->bitmapFittingLongSide(
           static_cast<std::uint32_t>(size.maxLongSide));
       ASSERT_TRUE(whileDecoding && afterDecoding);
-      Data expected = pixelsByDefinition(spec, size.width, size.height, size.maxLongSide);
+      Data expected = pixelsByDefinition(variant, size.width, size.height, size.maxLongSide);
       EXPECT_EQ(whileDecoding->rgba(), expected);
       EXPECT_EQ(afterDecoding->rgba(), expected);
       EXPECT_EQ(referenced->size(),
@@ -266,7 +266,7 @@ TEST(ImageReduce, ReducedPixelsAreTheMeansOfTheBlocksTheyCover) {
     }
   }
   // Pictures that fit, and no limit, come whole.
-  auto image = Image::initWithData(writePng(specs[1]));
+  auto image = Image::initWithData(writePng(variants[1]));
   EXPECT_EQ(image->bitmapFittingLongSide(kWidth), image->bitmap());
   EXPECT_EQ(image->bitmapFittingLongSide(0), image->bitmap());
 }
