@@ -106,6 +106,16 @@ class PictureBuilder {
   int channels_;
 };
 
+// The 32-bit big-endian number at `p`: four bytes in PNG order as one Leptonica word.
+inline std::uint32_t bigEndian32(const std::uint8_t* p) {
+  return (std::uint32_t{p[0]} << 24) | (std::uint32_t{p[1]} << 16) | (std::uint32_t{p[2]} << 8) |
+         p[3];
+}
+
+// Writes `width` grey bytes in reading order into a Leptonica 8-bit row (first pixel in
+// the high byte of each word).
+void packGreyRow(l_uint32* line, const std::uint8_t* bytes, std::uint32_t width);
+
 // Dots per inch from a PNG's pixels per metre.
 l_int32 dotsPerInch(std::uint32_t perMetre);
 

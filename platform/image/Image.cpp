@@ -42,6 +42,12 @@ std::string formatName(l_int32 format) {
 
 // The bitmap of encoded bytes; with a `maxLongSide`, reduced to fit (a PNG while it is
 // decoded, anything else afterwards).
+// `bitmap` reduced to fit `maxLongSide`; itself when it fits or reducing fails.
+std::shared_ptr<Bitmap> reducedBitmap(std::shared_ptr<Bitmap> bitmap, std::uint32_t maxLongSide) {
+  PIX* reduced = bitmap ? reducePix(bitmap->native().pix, maxLongSide) : nullptr;
+  return reduced ? bitmapFromPix(reduced, nullptr) : bitmap;
+}
+
 std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure,
                                     std::uint32_t maxLongSide = 0, Size* fullSize = nullptr) {
   quietLeptonica();
@@ -76,9 +82,7 @@ std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure,
   }
   if (fullSize) *fullSize = Size{static_cast<double>(width), static_cast<double>(height)};
   // Reduced once the pixels are normal: colour maps and 16-bit samples are gone by then.
-  auto bitmap = bitmapFromPix(pix, failure);
-  PIX* reduced = bitmap ? reducePix(bitmap->native().pix, maxLongSide) : nullptr;
-  return reduced ? bitmapFromPix(reduced, failure) : bitmap;
+  return reducedBitmap(bitmapFromPix(pix, failure), maxLongSide);
 }
 
 std::string decodePercentEscapes(std::string_view text) {
@@ -302,10 +306,7 @@ std::shared_ptr<Bitmap> Image::bitmap() const {
 
 std::shared_ptr<Bitmap> Image::bitmapFittingLongSide(std::uint32_t maxLongSide) const {
   if (maxLongSide == 0 || decoded_.load(std::memory_order_acquire) || path_.empty()) {
-    auto full = bitmap();
-    if (!full || maxLongSide == 0) return full;
-    PIX* reduced = reducePix(full->native().pix, maxLongSide);
-    return reduced ? bitmapFromPix(reduced, nullptr) : full;
+    return reducedBitmap(bitmap(), maxLongSide);
   }
   // Not decoded yet: decode reduced, and keep nothing, so that the full-size pixels are
   // never held. A failure is left for bitmap() and failureReason() to find and keep.

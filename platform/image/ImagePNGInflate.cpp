@@ -20,11 +20,6 @@ namespace {
 // Inflated rows beyond this many bytes go through libpng a row at a time instead.
 constexpr std::size_t kMaxScratchBytes = std::size_t{512} << 20;
 
-std::uint32_t bigEndian32(const std::uint8_t* p) {
-  return (std::uint32_t{p[0]} << 24) | (std::uint32_t{p[1]} << 16) | (std::uint32_t{p[2]} << 8) |
-         p[3];
-}
-
 struct Layout {
   std::uint32_t width = 0, height = 0;
   int channels = 0;  // 1 grey, 3 RGB, 4 RGBA

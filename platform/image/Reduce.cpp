@@ -75,12 +75,7 @@ void RowReducer::flush() {
       std::uint32_t sum = sums[first] + sums[first + 1] * (firstColumn_[j + 1] - first - 1);
       bytes[j] = static_cast<std::uint8_t>(sum * columnReciprocal_[j] * rowReciprocal + 0.5);
     }
-    std::uint32_t words = size_.width / 4;
-    for (std::uint32_t k = 0; k < words; ++k) {
-      line[k] = (l_uint32{bytes[4 * k]} << 24) | (l_uint32{bytes[4 * k + 1]} << 16) |
-                (l_uint32{bytes[4 * k + 2]} << 8) | bytes[4 * k + 3];
-    }
-    for (std::uint32_t j = words * 4; j < size_.width; ++j) SET_DATA_BYTE(line, j, bytes[j]);
+    packGreyRow(line, bytes, size_.width);
     std::fill(columnSums_.begin(), columnSums_.end(), 0);
     rowsInTarget_ = 0;
     return;
@@ -111,14 +106,13 @@ void RowReducer::flush() {
   rowsInTarget_ = 0;
 }
 
-namespace {
+namespace {}  // namespace
 
-std::uint32_t bigEndian32(const std::uint8_t* p) {
-  return (std::uint32_t{p[0]} << 24) | (std::uint32_t{p[1]} << 16) | (std::uint32_t{p[2]} << 8) |
-         p[3];
+void packGreyRow(l_uint32* line, const std::uint8_t* bytes, std::uint32_t width) {
+  std::uint32_t words = width / 4;
+  for (std::uint32_t k = 0; k < words; ++k) line[k] = bigEndian32(bytes + std::size_t{k} * 4);
+  for (std::uint32_t x = words * 4; x < width; ++x) SET_DATA_BYTE(line, x, bytes[x]);
 }
-
-}  // namespace
 
 l_int32 dotsPerInch(std::uint32_t perMetre) { return static_cast<l_int32>(perMetre / 39.37 + 0.5); }
 
@@ -144,14 +138,13 @@ void PictureBuilder::addRow(const std::uint8_t* row) {
     reducer_->addRow(row);
     return;
   }
-  // Leptonica keeps pixels in 32-bit words with the first pixel in the high byte.
   l_uint32* line =
       pixGetData(pix_) + std::size_t{nextRow_++} * static_cast<std::size_t>(pixGetWpl(pix_));
-  std::uint32_t words = channels_ == 4 ? width_ : width_ / 4;
-  for (std::uint32_t k = 0; k < words; ++k) line[k] = bigEndian32(row + std::size_t{k} * 4);
   if (channels_ == 1) {
-    for (std::uint32_t x = words * 4; x < width_; ++x) SET_DATA_BYTE(line, x, row[x]);
+    packGreyRow(line, row, width_);
+    return;
   }
+  for (std::uint32_t x = 0; x < width_; ++x) line[x] = bigEndian32(row + std::size_t{x} * 4);
 }
 
 PIX* PictureBuilder::take() {
