@@ -64,6 +64,23 @@ CORVEL_EXPORT extern const char* const RVVisionLanguageNameKey;          // "nam
 CORVEL_EXPORT extern const char* const RVVisionLanguageSecondaryKey;     // "secondary"
 CORVEL_EXPORT extern const char* const RVVisionLanguageForcePrimaryKey;  // "forcePrimary"
 
+// How a job orders the recognised lines into its text.
+enum RVReadingOrder : std::int64_t {
+  // The layout analysis (RVTextLayoutAnalyser): columns by left edge, top to bottom,
+  // paragraphs and columns joined by "\n\n". The default.
+  RVReadingOrderLayoutAnalysis = 0,
+  // The engine's own blocks and paragraphs in its order: lines joined by "\n",
+  // paragraphs by "\n\n". Keeps a form's or a receipt's rows together and does not join
+  // lines of unrelated blocks; the analyser's layoutBlocks() then hold the engine's
+  // blocks (columns), paragraphs and lines.
+  RVReadingOrderEngine = 1,
+  // The engine's order with rows kept together: side-by-side blocks whose lines pair up
+  // row by row, one of them of short lines (a receipt's prices, a form's values, a
+  // table's columns, a transcript's line numbers), are read row by row, each row left
+  // to right on one line; blocks of long lines (an article's columns) stay apart.
+  RVReadingOrderRows = 2,
+};
+
 class CORVEL_EXPORT RVVisionOCR : public std::enable_shared_from_this<RVVisionOCR> {
  public:
   // Called once with the reading-order text and nullopt, or "" and the error.
@@ -120,6 +137,11 @@ class CORVEL_EXPORT RVVisionOCR : public std::enable_shared_from_this<RVVisionOC
   // Cancels this job's operation unless it has finished or is already cancelled; does
   // nothing for a job without one (an unsupported system, or not started).
   void cancelOCRJob();
+  // Cancels the job as cancelOCRJob does and, when it is already running, stops its
+  // recognition inside the engine: the completion is then called with "" and a
+  // TextRecognitionErrorCancelled error (soon: the engine looks at the request between
+  // words). cancelOCRJob leaves a running job to finish, as hosts have always had it.
+  void stopOCRJob();
 
   // --- Recognition results ---------------------------------------------------------------
 
@@ -150,6 +172,17 @@ class CORVEL_EXPORT RVVisionOCR : public std::enable_shared_from_this<RVVisionOC
   // the front; everything else keeps its order.
   LanguageCodes orderLanguageCodes(const LanguageCodes& codes) const;
 
+  // --- Options (set before the job starts) ------------------------------------------------
+
+  // The order of the text given to the completion; RVReadingOrderLayoutAnalysis unless set.
+  RVReadingOrder readingOrder() const { return readingOrder_; }
+  void setReadingOrder(RVReadingOrder order) { readingOrder_ = order; }
+  // The longest the recognition may take, in seconds; a page past it ends with ""
+  // and a TextRecognitionErrorTimedOut error. 0 (the default): the recogniser's own
+  // deadline, which grows with the page's size.
+  double timeout() const { return timeout_; }
+  void setTimeout(double seconds) { timeout_ = seconds; }
+
   // --- Properties --------------------------------------------------------------------------
 
   // A flag callers may keep on the job; recognition does not look at it.
@@ -174,6 +207,9 @@ class CORVEL_EXPORT RVVisionOCR : public std::enable_shared_from_this<RVVisionOC
               bool useFastTextRecognition);
 
   bool cancelOCR_ = false;
+  RVReadingOrder readingOrder_ = RVReadingOrderLayoutAnalysis;
+  double timeout_ = 0;
+  std::shared_ptr<JobState> state_;
   std::shared_ptr<RVTextLayoutAnalyser> layoutAnalyser_;
   std::shared_ptr<BlockOperation> ocrOperation_;
   Completion completion_;

@@ -37,9 +37,8 @@
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
+#include "TesseractCommand.h"
 #include "support/TextDistance.h"
-
-extern char** environ;
 
 namespace {
 
@@ -53,12 +52,7 @@ struct Sample {
   std::string expected;  // source text, for the error rate
 };
 
-std::string readText(const fs::path& path) {
-  std::ifstream in(path);
-  std::stringstream text;
-  text << in.rdbuf();
-  return text.str();
-}
+std::string readText(const fs::path& path) { return bench::readWhole(path.string()); }
 
 std::vector<Sample> pages(std::size_t limit) {
   std::vector<Sample> out;
@@ -146,58 +140,18 @@ Run runOurs(const std::vector<Sample>& samples, bool fast, TesseractRecognizer& 
   return run;
 }
 
-bool commandAvailable() { return std::system("command -v tesseract >/dev/null 2>&1") == 0; }
-
-// Starts `tesseract IMAGE OUT -l eng` with its output silenced; false when it cannot start.
-bool spawnTesseract(const std::string& image, const std::string& outBase, char** envp, pid_t* pid) {
-  std::vector<std::string> args{"tesseract", image, outBase, "-l", "eng"};
-  std::vector<char*> argv;
-  for (auto& a : args) argv.push_back(a.data());
-  argv.push_back(nullptr);
-  posix_spawn_file_actions_t quiet;
-  posix_spawn_file_actions_init(&quiet);
-  posix_spawn_file_actions_addopen(&quiet, STDOUT_FILENO, "/dev/null", O_WRONLY, 0);
-  posix_spawn_file_actions_addopen(&quiet, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
-  bool started = posix_spawnp(pid, "tesseract", &quiet, nullptr, argv.data(), envp) == 0;
-  posix_spawn_file_actions_destroy(&quiet);
-  return started;
-}
-
 // The command on every image, kCommandProcesses at a time, each reading its image and
 // writing its text to a file.
 Run runCommand(const std::vector<Sample>& samples, const fs::path& work) {
+  std::vector<bench::CommandItem> items;
+  for (std::size_t i = 0; i < samples.size(); ++i) {
+    items.push_back({samples[i].image, "eng", (work / ("out-" + std::to_string(i))).string()});
+  }
   Run run;
-  run.texts.resize(samples.size());
-  std::vector<std::string> env;
-  for (char** e = environ; *e; ++e) {
-    if (std::string(*e).rfind("OMP_THREAD_LIMIT=", 0) != 0) env.emplace_back(*e);
+  for (const auto& result : bench::runTesseractBatch(items, kCommandProcesses, &run.seconds)) {
+    run.texts.push_back(result.text);
+    if (result.failed) ++run.failures;
   }
-  env.emplace_back("OMP_THREAD_LIMIT=1");
-  std::vector<char*> envp;
-  for (auto& e : env) envp.push_back(e.data());
-  envp.push_back(nullptr);
-
-  auto start = std::chrono::steady_clock::now();
-  std::size_t next = 0, running = 0;
-  auto outBase = [&](std::size_t i) { return (work / ("out-" + std::to_string(i))).string(); };
-  while (next < samples.size() || running > 0) {
-    while (running < kCommandProcesses && next < samples.size()) {
-      pid_t pid = 0;
-      if (spawnTesseract(samples[next].image, outBase(next), envp.data(), &pid)) {
-        ++running;
-      } else {
-        ++run.failures;
-      }
-      ++next;
-    }
-    int status = 0;
-    if (running > 0 && wait(&status) > 0) {
-      --running;
-      if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) ++run.failures;
-    }
-  }
-  run.seconds = since(start);
-  for (std::size_t i = 0; i < samples.size(); ++i) run.texts[i] = readText(outBase(i) + ".txt");
   return run;
 }
 
@@ -206,7 +160,7 @@ Run runCommand(const std::vector<Sample>& samples, const fs::path& work) {
 double commandPeakMiB(const Sample& sample, const fs::path& work) {
   pid_t pid = 0;
   double peak = -1;
-  if (spawnTesseract(sample.image, (work / "peak").string(), environ, &pid)) {
+  if (bench::spawnTesseract(sample.image, (work / "peak").string(), "eng", environ, &pid)) {
     int status = 0;
     rusage usage{};
     if (wait4(pid, &status, 0, &usage) == pid) peak = usage.ru_maxrss / 1024.0;
@@ -256,7 +210,7 @@ int main(int argc, char** argv) {
   PlatformRegistry::setTextRecognizer(recognizer);
   RVVisionOCR::ocrQueue();  // made on the main thread, as hosts do
 
-  bool command = commandAvailable();
+  bool command = bench::tesseractAvailable();
   fs::path work = fs::temp_directory_path() / ("bench_ocr." + std::to_string(getpid()));
   fs::create_directories(work);
   std::printf("bench_ocr: %u cores; command: %s\n", std::thread::hardware_concurrency(),

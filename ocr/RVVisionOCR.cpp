@@ -8,6 +8,7 @@
 #include "Corvelbase/RVTextLayoutAnalyser.h"
 #include "Corvelbase/platform/Log.h"
 #include "Corvelbase/platform/Platform.h"
+#include "ocr/EngineOrder.h"
 
 namespace corvel {
 
@@ -54,6 +55,7 @@ std::string withObject(const char* format, const std::string& value) {
 struct RVVisionOCR::JobState {
   std::shared_ptr<Image> image;
   std::optional<Error> error;
+  std::atomic<bool> stopped{false};  // stopOCRJob: the engine is asked to stop
 };
 
 std::shared_ptr<RVVisionOCR> RVVisionOCR::init() {
@@ -136,6 +138,7 @@ void RVVisionOCR::startJob(std::shared_ptr<Image> image, LanguageCodes languageC
                            bool useFastTextRecognition, Completion completion) {
   auto state = std::make_shared<JobState>();
   state->image = std::move(image);
+  state_ = state;
   if (!recognitionAvailable()) {
     // Reported at once, on the caller's thread; nothing is queued.
     if (completion) completion(String(), unsupportedError());
@@ -159,7 +162,17 @@ void RVVisionOCR::runJob(const std::shared_ptr<JobState>& state, const LanguageC
   auto request = TextRecognitionRequest::initWithCompletionHandler(
       [self, state](TextRecognitionRequest& finished, const std::optional<Error>& error) {
         String text;
-        if (!error) {
+        if (!error && self->readingOrder_ != RVReadingOrderLayoutAnalysis) {
+          const auto& observations =
+              finished.results().value_or(std::vector<RecognizedTextObservation>());
+          auto columns = self->readingOrder_ == RVReadingOrderRows
+                             ? ocr_internal::rowsOrderColumns(observations)
+                             : ocr_internal::engineOrderColumns(observations);
+          text = ocr_internal::engineOrderText(columns);
+          self->layoutAnalyser_->setColumnBlocks(
+              std::make_shared<RVBlockArray>(std::move(columns)));
+          self->layoutAnalyser_->setOrderedText(text);
+        } else if (!error) {
           self->addRecognitionBlocksToAnalyser(finished);
           Size size = state->image ? state->image->size() : Size{};
           self->layoutAnalyser_->analyse(size, kHorizontalWritingDirection);
@@ -177,6 +190,8 @@ void RVVisionOCR::runJob(const std::shared_ptr<JobState>& state, const LanguageC
     request->setRevision(2);
   }
   request->setUsesLanguageCorrection(true);
+  request->setTimeout(timeout_);
+  request->setCancellationCheck([state] { return state->stopped.load(std::memory_order_relaxed); });
   request->setRecognitionLevel(useFastTextRecognition ? TextRecognitionLevelFast
                                                       : TextRecognitionLevelAccurate);
   if (languageCodes.empty()) {
@@ -230,6 +245,11 @@ void RVVisionOCR::cancelOCRJob() {
   if (ocrOperation_ && !ocrOperation_->isFinished() && !ocrOperation_->isCancelled()) {
     ocrOperation_->cancel();
   }
+}
+
+void RVVisionOCR::stopOCRJob() {
+  if (state_) state_->stopped.store(true, std::memory_order_relaxed);
+  cancelOCRJob();
 }
 
 }  // namespace corvel

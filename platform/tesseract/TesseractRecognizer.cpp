@@ -1,6 +1,7 @@
 // The Tesseract recogniser: page preparation, engine settings per level, automatic
 // language detection and the conversion of Tesseract's lines into observations.
 #include <omp.h>
+#include <tesseract/ocrclass.h>
 #include <tesseract/resultiterator.h>
 
 #include <algorithm>
@@ -15,12 +16,19 @@
 #include "platform/image/BitmapNative.h"
 #include "platform/tesseract/EnginePool.h"
 #include "platform/tesseract/LanguageIdentification.h"
+#include "platform/tesseract/PagePreparation.h"
 
 namespace corvel {
 
 using tesseract_backend::Engine;
 using tesseract_backend::EngineKey;
 using tesseract_backend::EnginePool;
+using tesseract_backend::measurePage;
+using tesseract_backend::PagePlan;
+using tesseract_backend::PlanLimits;
+using tesseract_backend::planPage;
+using tesseract_backend::scalePage;
+using tesseract_backend::Threshold;
 
 namespace {
 
@@ -50,8 +58,25 @@ constexpr double kMinDetectedConfidence = 0.75;
 // Images whose short side is below this many pixels hold too little text to tell their
 // orientation.
 constexpr int kMinOrientationSide = 300;
-// Resolutions believed from a file, and the one assumed otherwise.
-constexpr int kMinResolution = 70, kMaxResolution = 2400, kDefaultResolution = 300;
+// Text smaller than this many pixels is enlarged before recognition: the engine reads
+// small text far better enlarged (forms scanned at 100 dpi lose half their words).
+constexpr double kEnlargeBelow = 12, kEnlargeTo = 20;
+constexpr double kFastEnlargeBelow = 10, kFastEnlargeTo = 14;
+constexpr std::uint32_t kMaxScaledLongSide = 8000;
+// A reading is poor below this mean confidence, or with fewer characters than this
+// share of the character-like shapes the page shows (when it shows enough to judge).
+constexpr double kPoorConfidence = 0.75, kUnreadableConfidence = 0.5;
+constexpr double kPoorCoverage = 0.6;
+constexpr int kMinCharactersToJudge = 40;
+// A second binarisation is kept when its confidence-weighted characters exceed the
+// first's by this factor; a turned page must beat the upright one by more, and by this
+// much mean confidence.
+constexpr double kBetterWeight = 1.05;
+constexpr double kTurnedWeight = 1.3;
+constexpr double kTurnedConfidenceGain = 0.1;
+// A pass that finds more words than this (at least, and per megapixel) is reading specks.
+constexpr int kMinWordLimit = 20000;
+constexpr double kWordsPerMegapixel = 2500;
 
 // Debian's libtesseract runs its own OpenMP threads (four per parallel region); with
 // several recognitions at once they only compete with each other for the cores and make
@@ -139,7 +164,8 @@ std::string trimmed(const char* text) {
 struct Page {
   PIX* pix = nullptr;  // borrowed or owned
   PixPtr owned;
-  int resolution = kDefaultResolution;
+  int fileResolution = 0;  // what the file states, 0 when nothing
+  int resolution = 0;      // told to the engine; 0: the engine estimates it
 
   void replace(PIX* replacement) {
     owned.reset(replacement);
@@ -151,9 +177,7 @@ struct Page {
 Page preparePage(const Bitmap& bitmap) {
   Page page;
   page.pix = bitmap.native().pix;
-  int resolution = pixGetXRes(page.pix);
-  // Resolutions outside the range are missing or nonsense in the file.
-  if (resolution >= kMinResolution && resolution <= kMaxResolution) page.resolution = resolution;
+  page.fileResolution = pixGetYRes(page.pix);
   // Transparency is composed over white: transparent pixels are often black underneath.
   if (pixGetDepth(page.pix) == 32 && pixGetSpp(page.pix) == 4) {
     page.replace(pixAlphaBlendUniform(page.pix, 0xffffff00));
@@ -172,20 +196,95 @@ bool capLongSide(Page& page, std::uint32_t maxLongSide) {
   PIX* reduced = reducePix(page.pix, maxLongSide);
   if (!reduced) return false;
   page.replace(reduced);
-  page.resolution = std::max(1, static_cast<int>(static_cast<float>(page.resolution) * scale));
+  page.fileResolution = static_cast<int>(static_cast<float>(page.fileResolution) * scale);
+  return true;
+}
+
+// Applies the plan's crop, scale and resolution; false when that fails.
+bool applyPlan(Page& page, const PagePlan& plan) {
+  if (plan.crop.w > 0) {
+    PIX* cropped = tesseract_backend::cropPage(page.pix, plan.crop);
+    if (!cropped) return false;
+    page.replace(cropped);
+  }
+  if (plan.scale != 1) {
+    PIX* scaled = scalePage(page.pix, plan.scale);
+    if (!scaled) return false;
+    page.replace(scaled);
+  }
+  page.resolution = plan.resolution;
   return true;
 }
 
 struct PassResult {
   std::vector<RecognizedTextObservation> observations;
-  std::string text;  // all lines, for language identification
+  std::string text;       // all lines, for language identification
+  double characters = 0;  // not counting spaces
+  double weight = 0;      // characters weighted by their line's confidence
+
+  double meanConfidence() const { return characters > 0 ? weight / characters : 0; }
 };
 
-double meanConfidence(const PassResult& result) {
-  if (result.observations.empty()) return 0;
-  double sum = 0;
-  for (const auto& observation : result.observations) sum += observation.candidates[0].confidence;
-  return sum / static_cast<double>(result.observations.size());
+enum class Reading {
+  Good,
+  Unreadable,  // hardly any confidence: garbage, as from a page turned on its side
+  Doubtful,    // low confidence
+  Sparse,      // confident, but far fewer characters than the page shows
+};
+
+Reading judge(const PassResult& result, const PagePlan& plan) {
+  if (result.meanConfidence() < kUnreadableConfidence) return Reading::Unreadable;
+  if (result.meanConfidence() < kPoorConfidence) return Reading::Doubtful;
+  if (plan.characters >= kMinCharactersToJudge &&
+      result.characters < kPoorCoverage * plan.characters) {
+    return Reading::Sparse;
+  }
+  return Reading::Good;
+}
+
+struct PassSettings {
+  Threshold threshold = Threshold::Otsu;
+  // The page as one block of rows rather than segmented into columns: the automatic
+  // segmentation sometimes drops a column of short items (a receipt's prices).
+  bool singleBlock = false;
+  bool invertedLines = false;  // light text on a dark ground: always read inverted lines
+};
+
+// Why a pass stopped early.
+enum class Stop { None, Cancelled, TimedOut, Overgrown };
+
+// What the engine's progress monitor asks while it recognises: whether to stop.
+struct Watch {
+  const TextRecognitionRequest* request = nullptr;
+  std::chrono::steady_clock::time_point deadline;
+  double seconds = 0;  // the deadline's distance from the start, for the message
+  int maxWords = 0;
+  Stop stop = Stop::None;
+
+  static bool shouldStop(void* self, int words) {
+    auto* watch = static_cast<Watch*>(self);
+    if (watch->request->isCancelled()) {
+      watch->stop = Stop::Cancelled;
+    } else if (std::chrono::steady_clock::now() > watch->deadline) {
+      watch->stop = Stop::TimedOut;
+    } else if (words > watch->maxWords) {
+      // Specks the engine took for words: its paragraph step after recognition costs
+      // the square of their number, so the pass is given up before it gets there.
+      watch->stop = Stop::Overgrown;
+    }
+    return watch->stop != Stop::None;
+  }
+};
+
+int maxWordsFor(PIX* page) {
+  double megapixels = static_cast<double>(pixGetWidth(page)) * pixGetHeight(page) / 1e6;
+  return std::max(kMinWordLimit, static_cast<int>(kWordsPerMegapixel * megapixels));
+}
+
+std::string secondsText(double seconds) {
+  char text[32];
+  std::snprintf(text, sizeof text, "%.0f", seconds);
+  return text;
 }
 
 }  // namespace
@@ -295,30 +394,57 @@ struct TesseractRecognizer::Impl {
     return result;
   }
 
-  bool recognisePass(const Page& page, const std::string& models,
-                     const TextRecognitionRequest& request, bool fast, PassResult* out,
-                     Error* error) {
-    EngineKey key{models, request.usesLanguageCorrection()};
+  // One reading of `page` with `models` and a binarisation. False with *error when the
+  // engine cannot start, fails, or is stopped (cancelled, past the deadline, or
+  // overgrown with specks: *stop says which).
+  bool recognisePass(const Page& page, const std::string& models, const PassSettings& settings,
+                     Watch& watch, bool fast, PassResult* out, Error* error) {
+    EngineKey key{models, watch.request->usesLanguageCorrection()};
     bool recognised = false;
+    watch.stop = Stop::None;
+    watch.maxWords = maxWordsFor(page.pix);
     auto recognise = [&](tesseract::TessBaseAPI& api) {
-      // Only the automatic segmentation keeps the columns of a page apart.
-      api.SetPageSegMode(tesseract::PSM_AUTO);
-      // Sauvola's adaptive threshold keeps the text of unevenly lit pages.
-      api.SetVariable("thresholding_method", "2");
-      // Reading every poor line a second time inverted costs the fast level too much.
-      api.SetVariable("tessedit_do_invert", fast ? "0" : "1");
+      api.SetPageSegMode(settings.singleBlock ? tesseract::PSM_SINGLE_BLOCK : tesseract::PSM_AUTO);
+      api.SetVariable("thresholding_method", settings.threshold == Threshold::Sauvola ? "2" : "0");
+      // Reading every poor line a second time inverted costs the fast level too much,
+      // unless the page has light text on a dark ground, which only that reads.
+      api.SetVariable("tessedit_do_invert", fast && !settings.invertedLines ? "0" : "1");
       api.SetImage(page.pix);
+      // 0 leaves the engine to assume its lowest credible resolution and estimate the
+      // real one from the text it finds.
       api.SetSourceResolution(page.resolution);
-      recognised = api.Recognize(nullptr) == 0;
+      tesseract::ETEXT_DESC monitor;
+      monitor.cancel = &Watch::shouldStop;
+      monitor.cancel_this = &watch;
+      recognised = api.Recognize(&monitor) == 0 && watch.stop == Stop::None;
       return recognised;
     };
     auto collect = [&](tesseract::TessBaseAPI& api) { collectLines(api, page.pix, out); };
     bool started = withEngine(key, error, recognise, collect);
-    if (started && !recognised) {
-      *error = makeTextRecognitionError(TextRecognitionErrorEngineFailure,
-                                        "the recognition engine failed on the image");
+    if (!started) return false;
+    if (recognised) return true;
+    switch (watch.stop) {
+      case Stop::Cancelled:
+        *error = makeTextRecognitionError(TextRecognitionErrorCancelled,
+                                          "the recognition was cancelled");
+        break;
+      case Stop::TimedOut:
+        *error = makeTextRecognitionError(
+            TextRecognitionErrorTimedOut,
+            "the recognition ran past its deadline of " + secondsText(watch.seconds) + " s");
+        break;
+      case Stop::Overgrown:
+        *error = makeTextRecognitionError(TextRecognitionErrorEngineFailure,
+                                          "the page reads as more than " +
+                                              std::to_string(watch.maxWords) +
+                                              " words of specks; it is too noisy to recognise");
+        break;
+      case Stop::None:
+        *error = makeTextRecognitionError(TextRecognitionErrorEngineFailure,
+                                          "the recognition engine failed on the image");
+        break;
     }
-    return started && recognised;
+    return false;
   }
 
   static void collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult* out) {
@@ -330,7 +456,10 @@ struct TesseractRecognizer::Impl {
     // to right, so lines are read through the left-to-right iterator it is built on.
     tesseract::LTRResultIterator* it = results.get();
     double width = pixGetWidth(page), height = pixGetHeight(page);
+    std::size_t blocks = 0, paragraphs = 0;
     do {
+      if (it->PageIterator::IsAtBeginningOf(tesseract::RIL_BLOCK)) ++blocks;
+      if (it->PageIterator::IsAtBeginningOf(tesseract::RIL_PARA)) ++paragraphs;
       if (it->Empty(tesseract::RIL_TEXTLINE)) continue;
       std::unique_ptr<char[]> raw(it->LTRResultIterator::GetUTF8Text(tesseract::RIL_TEXTLINE));
       std::string text = trimmed(raw.get());
@@ -346,6 +475,12 @@ struct TesseractRecognizer::Impl {
       float confidence = std::clamp(
           it->LTRResultIterator::Confidence(tesseract::RIL_TEXTLINE) / 100.0f, 0.0f, 1.0f);
       observation.candidates.push_back({fromUTF8(text), confidence});
+      observation.block = blocks - 1;
+      observation.paragraph = paragraphs - 1;
+      auto characters = static_cast<double>(
+          std::count_if(text.begin(), text.end(), [](char c) { return c != ' '; }));
+      out->characters += characters;
+      out->weight += characters * confidence;
       out->observations.push_back(std::move(observation));
       out->text += text + "\n";
     } while (it->PageIterator::Next(tesseract::RIL_TEXTLINE));
@@ -408,6 +543,14 @@ std::optional<std::vector<std::string>> TesseractRecognizer::supportedRecognitio
   return impl_->installedCodes;  // every model reads at both levels
 }
 
+namespace {
+
+bool isStop(const Error& error) {
+  return error.code == TextRecognitionErrorCancelled || error.code == TextRecognitionErrorTimedOut;
+}
+
+}  // namespace
+
 std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recognize(
     const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) {
   keepEngineOnThisThread();
@@ -421,27 +564,58 @@ std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recog
     return std::nullopt;
   }
   Page page = preparePage(bitmap);
-  if (!page.pix || (fast && !capLongSide(page, impl.options.fastMaxLongSide))) {
+  bool prepared = page.pix && (!fast || capLongSide(page, impl.options.fastMaxLongSide));
+  PagePlan plan;
+  if (prepared) {
+    PlanLimits limits =
+        fast ? PlanLimits{kFastEnlargeBelow, kFastEnlargeTo, 0, impl.options.fastMaxLongSide}
+             : PlanLimits{kEnlargeBelow, kEnlargeTo, 0, kMaxScaledLongSide};
+    plan = planPage(measurePage(page.pix), page.fileResolution, limits);
+    prepared = applyPlan(page, plan);
+  }
+  if (!prepared) {
     *error = makeTextRecognitionError(TextRecognitionErrorImageUnreadable,
                                       "the image could not be prepared for recognition");
     return std::nullopt;
   }
 
-  // Accurate reads pages turned on their side too; detection needs the script anyway.
-  // Orientation needs a few lines of text to judge: a strip of a line or two is read
-  // as it comes.
+  Watch watch;
+  watch.request = &request;
+  double megapixels = static_cast<double>(pixGetWidth(page.pix)) * pixGetHeight(page.pix) / 1e6;
+  watch.seconds = request.timeout() > 0
+                      ? request.timeout()
+                      : std::max(impl.options.minTimeoutSeconds,
+                                 impl.options.timeoutSecondsPerMegapixel * megapixels);
+  watch.deadline = std::chrono::steady_clock::now() +
+                   std::chrono::duration_cast<std::chrono::steady_clock::duration>(
+                       std::chrono::duration<double>(watch.seconds));
+  auto read = [&](const Page& p, const std::string& m, PassSettings settings, PassResult* out,
+                  Error* e) { return impl.recognisePass(p, m, settings, watch, fast, out, e); };
+
+  // Detection needs the script before the first reading; otherwise orientation is only
+  // asked about a page that reads poorly upright, or whose characters lie on their side.
   Impl::Orientation orientation;
-  bool enoughForOrientation =
-      std::min(pixGetWidth(page.pix), pixGetHeight(page.pix)) >= kMinOrientationSide;
-  if ((!fast && enoughForOrientation) || detect) {
-    orientation = impl.detectOrientation(page, error);
-    if (orientation.rotateQuadrants != 0) {
-      PIX* upright = pixRotateOrth(page.pix, orientation.rotateQuadrants);
-      if (upright) page.replace(upright);
-    }
-  }
+  bool orientationAsked = false;
   std::string latin = impl.latinModels();
   bool scriptTrusted = false;
+  bool enoughForOrientation =
+      std::min(pixGetWidth(page.pix), pixGetHeight(page.pix)) >= kMinOrientationSide;
+  // The fast level turns only pages whose characters lie on their side: the detector
+  // costs less than reading such a page as it lies.
+  bool mayTurn = (!fast || detect) && enoughForOrientation;
+  bool sideways = enoughForOrientation && plan.sideways;
+  if (detect || sideways) {
+    orientation = impl.detectOrientation(page, error);
+    orientationAsked = true;
+  }
+  bool turnedFirst = false;
+  if (sideways && orientation.rotateQuadrants % 2 == 1) {
+    PIX* turned = pixRotateOrth(page.pix, orientation.rotateQuadrants);
+    if (turned) {
+      page.replace(turned);
+      turnedFirst = true;
+    }
+  }
   if (detect) {
     std::string scriptModel = modelForScript(orientation.script);
     scriptTrusted = !scriptModel.empty() && impl.isInstalled(scriptModel);
@@ -450,7 +624,71 @@ std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recog
   }
 
   PassResult result;
-  if (!impl.recognisePass(page, models, request, fast, &result, error)) return std::nullopt;
+  PassSettings settings{plan.threshold, false, plan.lightText};
+  if (!read(page, models, settings, &result, error)) {
+    // Specks the adaptive threshold made of a background: read as the engine would
+    // by default.
+    if (watch.stop != Stop::Overgrown || settings.threshold == Threshold::Otsu) {
+      return std::nullopt;
+    }
+    settings.threshold = Threshold::Otsu;
+    plan.alternativeWorthTrying = false;
+    if (!read(page, models, settings, &result, error)) return std::nullopt;
+  }
+  // Another reading of `candidate` with `tried`, kept when its confidence-weighted
+  // characters beat the best so far by `factor` (and its mean confidence by `gain`);
+  // false only when the recognition was stopped.
+  auto tryAnother = [&](Page& candidate, PassSettings tried, double factor, double gain,
+                        bool* kept) {
+    *kept = false;
+    PassResult other;
+    Error failure;
+    if (!read(candidate, models, tried, &other, &failure)) {
+      if (!isStop(failure)) return true;
+      *error = failure;
+      return false;
+    }
+    if (other.weight > factor * result.weight &&
+        other.meanConfidence() > result.meanConfidence() + gain) {
+      result = std::move(other);
+      settings = tried;
+      *kept = true;
+    }
+    return true;
+  };
+  // A page is turned only when it reads poorly as it is, the detector is sure of
+  // another orientation, and turned it reads clearly better: short codes in a table or
+  // a receipt's columns fool the detector often enough. A page read turned first is
+  // compared with its untouched self in the same way.
+  auto tryTurning = [&] {
+    if (!orientationAsked) orientation = impl.detectOrientation(page, error);
+    orientationAsked = true;
+    int quadrants = turnedFirst ? 4 - orientation.rotateQuadrants : orientation.rotateQuadrants;
+    if (quadrants % 4 == 0) return true;
+    Page turned;
+    turned.replace(pixRotateOrth(page.pix, quadrants));
+    turned.resolution = page.resolution;
+    bool kept = false;
+    if (!turned.pix) return true;
+    if (!tryAnother(turned, settings, kTurnedWeight, kTurnedConfidenceGain, &kept)) return false;
+    if (kept) page = std::move(turned);
+    return true;
+  };
+  bool kept = false;
+  if (mayTurn && judge(result, plan) == Reading::Unreadable && !tryTurning()) return std::nullopt;
+  if (plan.alternativeWorthTrying && judge(result, plan) != Reading::Good) {
+    PassSettings other = settings;
+    other.threshold = settings.threshold == Threshold::Otsu ? Threshold::Sauvola : Threshold::Otsu;
+    if (!tryAnother(page, other, kBetterWeight, -1, &kept)) return std::nullopt;
+  }
+  if (judge(result, plan) == Reading::Sparse) {
+    PassSettings rows = settings;
+    rows.singleBlock = true;
+    if (!tryAnother(page, rows, kBetterWeight, -1, &kept)) return std::nullopt;
+  }
+  if (mayTurn && !orientationAsked && judge(result, plan) == Reading::Unreadable && !tryTurning()) {
+    return std::nullopt;
+  }
   if (!detect) return std::move(result.observations);
 
   if (models.find('+') == std::string::npos) {
@@ -459,18 +697,21 @@ std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recog
     std::string better = modelForCode(tesseract_backend::identifyLanguage(result.text));
     if (!better.empty() && better != models && impl.isInstalled(better)) {
       PassResult second;
-      if (impl.recognisePass(page, better, request, fast, &second, error)) {
+      if (read(page, better, settings, &second, error)) {
         result = std::move(second);
+      } else if (isStop(*error)) {
+        return std::nullopt;
       }
     }
   }
-  if (scriptTrusted && meanConfidence(result) < kMinDetectedConfidence && !latin.empty() &&
+  if (scriptTrusted && result.meanConfidence() < kMinDetectedConfidence && !latin.empty() &&
       latin != models) {
     // A weak script verdict that read poorly: the page may be Latin after all.
     PassResult fallback;
-    if (impl.recognisePass(page, latin, request, fast, &fallback, error) &&
-        meanConfidence(fallback) > meanConfidence(result)) {
-      result = std::move(fallback);
+    if (read(page, latin, settings, &fallback, error)) {
+      if (fallback.meanConfidence() > result.meanConfidence()) result = std::move(fallback);
+    } else if (isStop(*error)) {
+      return std::nullopt;
     }
   }
   return std::move(result.observations);

@@ -144,6 +144,95 @@ TEST_F(OcrJob, EachObservationsBestReadingBecomesALineBlock) {
   EXPECT_NE(delivery.text.find(u"half sure"), String::npos);
 }
 
+// Lines of a receipt as an engine places them: items and prices in blocks of their own
+// side by side, then a paragraph of two long lines.
+std::vector<RecognizedTextObservation> receiptLines() {
+  auto at = [](const char* text, Rect box, std::size_t block, std::size_t paragraph) {
+    RecognizedTextObservation o = line(text, 0.9f, box);
+    o.block = block;
+    o.paragraph = paragraph;
+    return o;
+  };
+  return {at("MILK", Rect(0.1, 0.80, 0.2, 0.04), 0, 0),
+          at("BREAD", Rect(0.1, 0.70, 0.2, 0.04), 0, 0),
+          at("1.99", Rect(0.8, 0.805, 0.1, 0.04), 1, 1),
+          at("2.49", Rect(0.8, 0.695, 0.1, 0.04), 1, 1),
+          at("Thank you for shopping with us today", Rect(0.1, 0.40, 0.8, 0.04), 2, 2),
+          at("and come back again soon please", Rect(0.1, 0.35, 0.7, 0.04), 2, 2)};
+}
+
+TEST_F(OcrJob, ReadingOrdersGiveTheEnginesParagraphsAndKeepRowsTogether) {
+  fake_->setObservations(receiptLines());
+  struct Case {
+    RVReadingOrder order;
+    String text;
+  } cases[] = {
+      {RVReadingOrderEngine,
+       u"MILK\nBREAD\n\n1.99\n2.49\n\nThank you for shopping with us today\n"
+       u"and come back again soon please"},
+      {RVReadingOrderRows,
+       u"MILK 1.99\nBREAD 2.49\n\nThank you for shopping with us today\n"
+       u"and come back again soon please"},
+  };
+  for (const auto& c : cases) {
+    Delivery delivery;
+    auto job = RVVisionOCR::init();
+    job->setReadingOrder(c.order);
+    job->startOcrCGImage(whitePage(), {}, false, recordInto(&delivery));
+    finish(job);
+    EXPECT_EQ(delivery.text, c.text) << c.order;
+    // The tree holds the same order: one column per block (rows make one of two).
+    const auto& columns = *job->layoutAnalyser()->layoutBlocks();
+    ASSERT_EQ(columns.size(), c.order == RVReadingOrderRows ? 2u : 3u);
+    EXPECT_EQ(columns[0]->level(), RVRecognitionBlockLevelColumn);
+    EXPECT_EQ(job->layoutAnalyser()->text(), c.text);
+  }
+  // Two columns of running text stay apart however their lines align.
+  auto text = [](const char* t, double x, double y, std::size_t block) {
+    RecognizedTextObservation o = line(t, 0.9f, Rect(x, y, 0.4, 0.03));
+    o.block = o.paragraph = block;
+    return o;
+  };
+  fake_->setObservations({text("the first column runs on here", 0.05, 0.8, 0),
+                          text("and on down the page", 0.05, 0.75, 0),
+                          text("the second column starts here", 0.55, 0.8, 1),
+                          text("and ends at the foot", 0.55, 0.75, 1)});
+  Delivery delivery;
+  auto job = RVVisionOCR::init();
+  job->setReadingOrder(RVReadingOrderRows);
+  job->startOcrCGImage(whitePage(), {}, false, recordInto(&delivery));
+  finish(job);
+  EXPECT_EQ(delivery.text,
+            u"the first column runs on here\nand on down the page\n\n"
+            u"the second column starts here\nand ends at the foot");
+}
+
+TEST_F(OcrJob, StoppingARunningJobStopsItsRecognitionWhereCancellingLetsItFinish) {
+  fake_->hold();
+  Delivery stopped, finished;
+  auto first = RVVisionOCR::init();
+  first->setTimeout(42);
+  first->startOcrCGImage(whitePage(), {}, false, recordInto(&stopped));
+  auto second = startBlank(&finished);
+  ASSERT_TRUE(fake_->waitForRunning(2, 10s));
+  first->stopOCRJob();
+  second->cancelOCRJob();
+  // The stopped recognition comes out while the other is still held.
+  ASSERT_TRUE(fake_->waitForRecognitions(1, 10s));
+  EXPECT_EQ(fake_->running(), 1u);
+  fake_->release();
+  settle();
+  ASSERT_EQ(stopped.calls, 1);
+  EXPECT_EQ(stopped.text, u"");
+  ASSERT_TRUE(stopped.error);
+  EXPECT_EQ(stopped.error->code, TextRecognitionErrorCancelled);
+  EXPECT_EQ(finished.calls, 1);
+  EXPECT_FALSE(finished.error);
+  // The job's timeout reached the recogniser with the request.
+  auto requests = fake_->requests();
+  EXPECT_EQ(requests.front().timeout, 42);
+}
+
 TEST_F(OcrJob, TheCompletionRunsOnTheMainQueueAndTheJobAndImageAreLetGoThere) {
   fake_->setObservations({line("hello", 0.9f, Rect(0.1, 0.5, 0.3, 0.05))});
   auto page = whitePage();

@@ -82,15 +82,22 @@ std::optional<std::vector<RecognizedTextObservation>> FakeRecognizer::recognize(
                     request.recognitionLevel(),
                     request.recognitionLanguages(),
                     request.automaticallyDetectsLanguage(),
+                    request.timeout(),
                     bitmap.width(),
                     bitmap.height()};
   ++running_;
   maxRunning_ = std::max(maxRunning_, running_);
   changed_.notify_all();
-  changed_.wait(lock, [this] { return !held_; });
+  // A held recognition still stops when its request is cancelled, as an engine does
+  // between words; the flag is another thread's, so it is polled.
+  while (held_ && !request.isCancelled()) changed_.wait_for(lock, std::chrono::milliseconds(1));
   --running_;
   requests_.push_back(std::move(recorded));
   changed_.notify_all();
+  if (request.isCancelled()) {
+    *error = makeTextRecognitionError(TextRecognitionErrorCancelled, "cancelled");
+    return std::nullopt;
+  }
   if (failure_) {
     *error = *failure_;
     return std::nullopt;

@@ -24,6 +24,7 @@ class FakeRecognizer final : public TextRecognizer {
     std::int64_t recognitionLevel = -1;
     std::vector<std::string> languages;
     bool automaticallyDetectsLanguage = false;
+    double timeout = 0;
     std::uint32_t width = 0;
     std::uint32_t height = 0;
   };
@@ -40,7 +41,8 @@ class FakeRecognizer final : public TextRecognizer {
   // The long side the fake asks for fast requests (0, the default: full size).
   void setFastMaxLongSide(std::uint32_t side);
 
-  // While held, recognitions wait inside `recognize` until `release`.
+  // While held, recognitions wait inside `recognize` until `release`, or until their
+  // request is cancelled (they then fail with TextRecognitionErrorCancelled).
   void hold();
   void release();
   // Waits until at least `count` recognitions are inside `recognize`; false on timeout.
