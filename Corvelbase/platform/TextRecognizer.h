@@ -189,11 +189,13 @@ class CORVEL_EXPORT ImageRequestHandler {
 // Each page is prepared from what it shows (measured on a reduced grey copy): the
 // binarisation is the engine's global Otsu unless an adaptive threshold (Sauvola) finds
 // clearly more text without losing light-on-dark letters or turning a textured ground
-// into specks, as on unevenly lit photographs; small text is enlarged (to about 20
-// pixels, 14 at the fast level) and the engine is told the resolution the text height
-// suggests, unless the file states one close to it. A pass that reads poorly (low
-// confidence, or far fewer characters than the page shows) is read again with the
-// other binarisation, and the better reading kept.
+// into specks, as on unevenly lit photographs; text under 12 pixels (10 at the fast
+// level) is enlarged to 15 (14) and the engine is told the resolution the text height
+// suggests, unless the file states one close to it; a photographed sheet is cut from
+// the desk around it. A pass that reads poorly (low confidence, or far fewer
+// characters than the page shows) is read again with the other binarisation, or as
+// one block of rows (which keeps a receipt's column of prices that the automatic
+// segmentation drops), and the better reading kept.
 //
 // Levels: accurate reads at full resolution and, when a page still reads poorly, asks
 // the orientation detector (pages with a short side of at least 300 pixels) and keeps

@@ -60,7 +60,7 @@ constexpr double kMinDetectedConfidence = 0.75;
 constexpr int kMinOrientationSide = 300;
 // Text smaller than this many pixels is enlarged before recognition: the engine reads
 // small text far better enlarged (forms scanned at 100 dpi lose half their words).
-constexpr double kEnlargeBelow = 12, kEnlargeTo = 20;
+constexpr double kEnlargeBelow = 12, kEnlargeTo = 15;
 constexpr double kFastEnlargeBelow = 10, kFastEnlargeTo = 14;
 constexpr std::uint32_t kMaxScaledLongSide = 8000;
 // A reading is poor below this mean confidence, or with fewer characters than this

@@ -2,7 +2,11 @@
 // data, the engine pool and its failures; and whole recognition jobs on the committed
 // fixture pages and through `corvel ocr`, whose reading-order text must match the page's
 // source within a small character error rate (after normalising white space).
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cstring>
@@ -391,6 +395,62 @@ TEST(OcrCommand, JsonGivesTheTextAndTheBlockTreeAndTheOverlayIsAPictureOfThePage
   auto overlay = Image::initByReferencingFile(dir.file("over.png"));
   ASSERT_TRUE(overlay->bitmap()) << overlay->failureReason();
   EXPECT_EQ(overlay->size(), Image::initByReferencingFile(page("two-columns"))->size());
+}
+
+TEST(OcrCommand, APagePastItsTimeoutIsReportedAndTheOthersPrinted) {
+  testing::TempDir dir;
+  auto result = testing::runCommand(tool() + " ocr --timeout 0.000001 " + page("sample") + " 2>" +
+                                    dir.file("errors.txt"));
+  EXPECT_EQ(result.status, 1);
+  auto errors = testing::runCommand("cat " + dir.file("errors.txt")).output;
+  EXPECT_NE(errors.find("deadline"), std::string::npos) << errors;
+}
+
+// Ctrl-C after the first page is out: it stays printed, the rest is reported unread,
+// and the program ends at once with 130 rather than finishing the batch.
+TEST(OcrCommand, InterruptKeepsWhatIsFinished) {
+  int out[2];
+  ASSERT_EQ(pipe(out), 0);
+  pid_t child = fork();
+  ASSERT_GE(child, 0);
+  if (child == 0) {
+    dup2(out[1], STDOUT_FILENO);
+    int quiet = open("/dev/null", O_WRONLY);
+    dup2(quiet, STDERR_FILENO);
+    close(out[0]);
+    std::string program = tool(), first = page("lines/line-001"), big = page("pages/page-01");
+    std::vector<std::string> args{program, "ocr", "--lang", "en-US", first};
+    for (int i = 0; i < 8; ++i) args.push_back(big);
+    std::vector<char*> argv;
+    for (auto& a : args) argv.push_back(a.data());
+    argv.push_back(nullptr);
+    execv(program.c_str(), argv.data());
+    _exit(127);
+  }
+  close(out[1]);
+  std::string printed;
+  char buffer[4096];
+  auto started = std::chrono::steady_clock::now();
+  // The first page's header and text, then the interrupt.
+  while (printed.find("\n", printed.find("<==") + 4) == std::string::npos) {
+    ssize_t n = read(out[0], buffer, sizeof buffer);
+    if (n <= 0) break;
+    printed.append(buffer, static_cast<std::size_t>(n));
+  }
+  kill(child, SIGINT);
+  for (ssize_t n; (n = read(out[0], buffer, sizeof buffer)) > 0;) {
+    printed.append(buffer, static_cast<std::size_t>(n));
+  }
+  close(out[0]);
+  int status = 0;
+  waitpid(child, &status, 0);
+  double seconds =
+      std::chrono::duration<double>(std::chrono::steady_clock::now() - started).count();
+  ASSERT_TRUE(WIFEXITED(status));
+  EXPECT_EQ(WEXITSTATUS(status), 130);
+  EXPECT_NE(printed.find("==> " + page("lines/line-001") + " <=="), std::string::npos) << printed;
+  // Eight full pages take several times this even two at a time and without sanitizers.
+  EXPECT_LT(seconds, 15);
 }
 
 TEST(OcrCommand, MisuseExitsWithTwo) {
