@@ -11,8 +11,10 @@ namespace corvel::tesseract_backend {
 
 namespace {
 
-// The working copy's long side: enough to see 8-point text on an A4 page at 300 dpi.
-constexpr std::uint32_t kWorkingLongSide = 1800;
+// The working copy's long side: an A4 page at 300 dpi is seen at a quarter of its size,
+// where body text is still 5 pixels high. A page with more components too small to be
+// characters than characters has smaller text: it is measured again at twice the size.
+constexpr std::uint32_t kWorkingLongSide = 1300;
 // The engine's Sauvola settings: a window a third of an inch wide and its k factor.
 constexpr double kSauvolaWindowInches = 0.33;
 constexpr float kSauvolaFactor = 0.34f;
@@ -20,6 +22,8 @@ constexpr int kAssumedResolution = 300;
 // Character-like components, in pixels of the working copy.
 constexpr int kMinCharacterHeight = 4, kMaxCharacterHeight = 120;
 constexpr int kMaxCharacterAspect = 3;  // width over height
+// Components this high but below a character's are characters seen too small.
+constexpr int kMinSmallHeight = 2;
 // The resolution at which the median character is a 10-point face's: its median
 // component (mostly x-height letters) is about 5 points high.
 constexpr double kResolutionPerTextPixel = 72.0 / 5.0;
@@ -59,12 +63,12 @@ struct NumaDeleter {
 };
 
 // An 8-bit grey copy of `page` reduced by `*reduction` (a power of two) so that its
-// long side is at most kWorkingLongSide.
-PixPtr workingGrey(PIX* page, int* reduction) {
+// long side is at most `maxLongSide`.
+PixPtr workingGrey(PIX* page, std::uint32_t maxLongSide, int* reduction) {
   std::uint32_t longSide =
       static_cast<std::uint32_t>(std::max(pixGetWidth(page), pixGetHeight(page)));
   int r = 1;
-  while (longSide / static_cast<std::uint32_t>(r) > kWorkingLongSide && r < 16) r *= 2;
+  while (longSide / static_cast<std::uint32_t>(r) > maxLongSide && r < 16) r *= 2;
   *reduction = r;
   int depth = pixGetDepth(page);
   if (depth == 1) {
@@ -86,7 +90,7 @@ struct Component {
 // The character-like components of `binary` (light ones: of its inverse) that do not
 // touch the picture's edge: the page's own edge, a dark desk around a photographed
 // sheet, the ground around inverted text are not text. Counts every such component.
-void collectComponents(PIX* binary, bool light, int* components, std::vector<Component>* out) {
+void collectComponents(PIX* binary, bool light, Binarisation* counts, std::vector<Component>* out) {
   std::unique_ptr<BOXA, BoxaDeleter> boxes(pixConnCompBB(binary, 8));
   if (!boxes) return;
   int width = pixGetWidth(binary), height = pixGetHeight(binary);
@@ -95,7 +99,8 @@ void collectComponents(PIX* binary, bool light, int* components, std::vector<Com
     Component c{0, 0, 0, 0, light};
     boxaGetBoxGeometry(boxes.get(), i, &c.x, &c.y, &c.w, &c.h);
     if (c.x == 0 || c.y == 0 || c.x + c.w >= width || c.y + c.h >= height) continue;
-    ++*components;
+    ++counts->components;
+    if (c.h >= kMinSmallHeight && c.h < kMinCharacterHeight) ++counts->tooSmall;
     if (c.h >= kMinCharacterHeight && c.h <= kMaxCharacterHeight &&
         c.w <= kMaxCharacterAspect * c.h) {
       out->push_back(c);
@@ -173,10 +178,10 @@ Binarisation describe(PIX* binary, int reduction, Component* sheet, std::vector<
   Binarisation result;
   if (!binary) return result;
   std::vector<Component> dark, light;
-  collectComponents(binary, false, &result.components, &dark);
+  collectComponents(binary, false, &result, &dark);
   PixPtr inverse(pixInvert(nullptr, binary));
   if (!inverse) return result;
-  collectComponents(inverse.get(), true, &result.components, &light);
+  collectComponents(inverse.get(), true, &result, &light);
   std::vector<Component> letters = lightLetters(dark, light);
   result.lightCharacters = static_cast<int>(letters.size());
   std::vector<Component> characters = std::move(dark);
@@ -196,7 +201,8 @@ Binarisation describe(PIX* binary, int reduction, Component* sheet, std::vector<
 }
 
 PixPtr otsuBinary(PIX* grey) {
-  std::unique_ptr<NUMA, NumaDeleter> histogram(pixGetGrayHistogram(grey, 1));
+  // Every other pixel of every other row is plenty for a histogram.
+  std::unique_ptr<NUMA, NumaDeleter> histogram(pixGetGrayHistogram(grey, 2));
   l_int32 split = 0;
   if (!histogram || numaSplitDistribution(histogram.get(), 0.0f, &split, nullptr, nullptr, nullptr,
                                           nullptr, nullptr) != 0) {
@@ -223,17 +229,19 @@ bool plausibleResolution(int resolution) {
 
 }  // namespace
 
-PageMeasures measurePage(PIX* page) {
+namespace {
+
+PageMeasures measureAt(PIX* page, std::uint32_t maxLongSide, int* reduction) {
   PageMeasures measures;
   measures.width = static_cast<std::uint32_t>(pixGetWidth(page));
   measures.height = static_cast<std::uint32_t>(pixGetHeight(page));
-  int reduction = 1;
-  PixPtr grey = workingGrey(page, &reduction);
+  PixPtr grey = workingGrey(page, maxLongSide, reduction);
   if (!grey) return measures;
+  int r = *reduction;
   Component sheet{0, 0, 0, 0, true};
   std::vector<Component> otsuCharacters, sauvolaCharacters;
   PixPtr otsu = otsuBinary(grey.get());
-  measures.otsu = describe(otsu.get(), reduction, &sheet, &otsuCharacters);
+  measures.otsu = describe(otsu.get(), r, &sheet, &otsuCharacters);
   // Where Otsu leaves the page mostly light, no shadow or dark ground hides text from
   // it, and an adaptive threshold could only match it: Sauvola is measured only where
   // Otsu turns a large share of the page dark.
@@ -243,8 +251,7 @@ PageMeasures measurePage(PIX* page) {
                      (static_cast<double>(pixGetWidth(grey.get())) * pixGetHeight(grey.get()));
   measures.unevenlyLit = darkShare >= kMinDarkShareForSauvola;
   if (measures.unevenlyLit) {
-    measures.sauvola = describe(sauvolaBinary(grey.get(), reduction).get(), reduction, nullptr,
-                                &sauvolaCharacters);
+    measures.sauvola = describe(sauvolaBinary(grey.get(), r).get(), r, nullptr, &sauvolaCharacters);
   } else {
     measures.sauvola = measures.otsu;
   }
@@ -257,9 +264,17 @@ PageMeasures measurePage(PIX* page) {
        (!speckled && countOutside(sheet, sauvolaCharacters) > kMaxCharactersOutsideSheet))) {
     sheet.w = 0;
   }
-  if (sheet.w > 0) {
-    measures.sheet = {sheet.x * reduction, sheet.y * reduction, sheet.w * reduction,
-                      sheet.h * reduction};
+  if (sheet.w > 0) measures.sheet = {sheet.x * r, sheet.y * r, sheet.w * r, sheet.h * r};
+  return measures;
+}
+
+}  // namespace
+
+PageMeasures measurePage(PIX* page) {
+  int reduction = 1;
+  PageMeasures measures = measureAt(page, kWorkingLongSide, &reduction);
+  if (reduction > 1 && measures.otsu.tooSmall > measures.otsu.characters) {
+    measures = measureAt(page, kWorkingLongSide * 2, &reduction);
   }
   return measures;
 }

@@ -26,6 +26,7 @@ struct Binarisation {
   int characters = 0;       // components of a character's height and shape
   int lightCharacters = 0;  // of them, light letters on a dark ground (not counters)
   int components = 0;       // all of them, noise included
+  int tooSmall = 0;         // of them, a little lower than a character
   double medianHeight = 0;  // of the characters, in pixels of the page as given
   double medianAspect = 0;  // of the characters, width over height
 };
