@@ -191,6 +191,7 @@ Binarisation describe(PIX* binary, int reduction, Component* sheet, std::vector<
   for (const auto& c : characters) {
     heights.push_back(c.h * reduction);
     aspects.push_back(static_cast<double>(c.w) / c.h);
+    result.boxes.push_back({c.x * reduction, c.y * reduction, c.w * reduction, c.h * reduction});
   }
   result.characters = static_cast<int>(characters.size());
   result.medianHeight = median(heights);
@@ -302,6 +303,7 @@ PagePlan planPage(const PageMeasures& measures, int fileResolution, const PlanLi
                                 (sauvolaSafe && (measures.unevenlyLit || measures.sheet.w > 0));
   const Binarisation& chosen = plan.threshold == Threshold::Sauvola ? sauvola : otsu;
   plan.characters = chosen.characters;
+  plan.characterBoxes = chosen.boxes;
   plan.sideways = chosen.medianAspect > kSidewaysAspect;
   // Lying on their side, characters are as high as they are wide upright.
   plan.textHeight = chosen.medianHeight * (plan.sideways ? chosen.medianAspect : 1.0);

@@ -14,26 +14,28 @@
 #include <leptonica/allheaders.h>
 
 #include <cstdint>
+#include <vector>
 
 namespace corvel::tesseract_backend {
 
 // The engine's own names for its binarisations (its "thresholding_method" values).
 enum class Threshold { Otsu = 0, Sauvola = 2 };
 
-// What one binarisation of the working copy shows: components of either polarity that
-// do not touch the picture's edge.
-struct Binarisation {
-  int characters = 0;       // components of a character's height and shape
-  int lightCharacters = 0;  // of them, light letters on a dark ground (not counters)
-  int components = 0;       // all of them, noise included
-  int tooSmall = 0;         // of them, a little lower than a character
-  double medianHeight = 0;  // of the characters, in pixels of the page as given
-  double medianAspect = 0;  // of the characters, width over height
-};
-
 // A rectangle of the page in pixels from its top left; empty when w is 0.
 struct PageBox {
   int x = 0, y = 0, w = 0, h = 0;
+};
+
+// What one binarisation of the working copy shows: components of either polarity that
+// do not touch the picture's edge.
+struct Binarisation {
+  int characters = 0;          // components of a character's height and shape
+  int lightCharacters = 0;     // of them, light letters on a dark ground (not counters)
+  int components = 0;          // all of them, noise included
+  int tooSmall = 0;            // of them, a little lower than a character
+  double medianHeight = 0;     // of the characters, in pixels of the page as given
+  double medianAspect = 0;     // of the characters, width over height
+  std::vector<PageBox> boxes;  // of the characters, in pixels of the page as given
 };
 
 struct PageMeasures {
@@ -46,7 +48,8 @@ struct PageMeasures {
 };
 
 // Measures `page` (1, 8 or 32 bits, no colour map, any alpha already composed). The
-// work is done on a grey copy reduced to at most about 2600 pixels on its long side.
+// work is done on a grey copy reduced to at most 1300 pixels on its long side (2600
+// where the characters come out too small to see there).
 PageMeasures measurePage(PIX* page);
 
 struct PagePlan {
@@ -60,6 +63,7 @@ struct PagePlan {
   bool sideways = false;   // the characters lie on their side: the page is turned
   bool lightText = false;  // some text is light on a dark ground
   PageBox crop;            // the part to read (the sheet), before scaling; empty: all
+  std::vector<PageBox> characterBoxes;  // of the chosen binarisation, page as given
 };
 
 struct PlanLimits {

@@ -10,6 +10,7 @@
 #include <cstdlib>
 #include <ctime>
 #include <filesystem>
+#include <map>
 #include <thread>
 
 #include "Corvelbase/platform/TextRecognizer.h"
@@ -74,6 +75,23 @@ constexpr int kMinCharactersToJudge = 40;
 constexpr double kBetterWeight = 1.05;
 constexpr double kTurnedWeight = 1.3;
 constexpr double kTurnedConfidenceGain = 0.1;
+// A block (no more than this share of the page) read with less confidence than this is
+// read again on its own, and replaced when that reading gains this much confidence.
+constexpr double kWeakBlockConfidence = 0.5, kWeakBlockGain = 0.25;
+constexpr double kMaxWeakBlockShare = 0.3;
+constexpr int kRegionMargin = 4;
+// Characters the measures saw whose centre lies in no line (widened by this many
+// pixels) were missed; clusters of at least this many (and pages with at most so many
+// missed, past which the page is a picture rather than missed text) are read again, at
+// most this many regions a page, and kept at this confidence, line by line where a
+// line overlaps no line read before by more than this share of its own box.
+constexpr int kCoverMargin = 3;
+constexpr std::size_t kMinMissedCharacters = 4, kMaxMissedCharacters = 600;
+constexpr int kMaxMissedRegions = 8;
+constexpr double kClusterXGap = 1.5, kClusterYGap = 3.0;
+constexpr double kMinClusterHeight = 0.6, kMaxClusterHeight = 1.6;
+constexpr double kMissedConfidence = 0.7;
+constexpr double kMaxOverlap = 0.3;
 // A pass that finds more words than this (at least, and per megapixel) is reading specks.
 constexpr int kMinWordLimit = 20000;
 constexpr double kWordsPerMegapixel = 2500;
@@ -166,6 +184,8 @@ struct Page {
   PixPtr owned;
   int fileResolution = 0;  // what the file states, 0 when nothing
   int resolution = 0;      // told to the engine; 0: the engine estimates it
+  // Where the measures saw characters, in this page's pixels; empty once turned.
+  std::vector<tesseract_backend::PageBox> characters;
 
   void replace(PIX* replacement) {
     owned.reset(replacement);
@@ -213,6 +233,12 @@ bool applyPlan(Page& page, const PagePlan& plan) {
     page.replace(scaled);
   }
   page.resolution = plan.resolution;
+  for (const auto& box : plan.characterBoxes) {
+    page.characters.push_back({static_cast<int>((box.x - plan.crop.x) * plan.scale),
+                               static_cast<int>((box.y - plan.crop.y) * plan.scale),
+                               static_cast<int>(box.w * plan.scale),
+                               static_cast<int>(box.h * plan.scale)});
+  }
   return true;
 }
 
@@ -447,6 +473,241 @@ struct TesseractRecognizer::Impl {
     return false;
   }
 
+  // One reading of the part of `page` inside `region` (its pixels, clipped to the page)
+  // as one block, with the lines' boxes normalised to the whole page. False with *error
+  // as recognisePass.
+  bool readRegion(const Page& page, tesseract_backend::PageBox region, const std::string& models,
+                  PassSettings settings, Watch& watch, bool fast, PassResult* out, Error* error) {
+    int width = pixGetWidth(page.pix), height = pixGetHeight(page.pix);
+    region.w = std::min(region.w, width - region.x);
+    region.h = std::min(region.h, height - region.y);
+    Page part;
+    if (region.w <= 0 || region.h <= 0) return true;
+    part.replace(tesseract_backend::cropPage(page.pix, region));
+    if (!part.pix) return true;
+    part.resolution = page.resolution;
+    settings.singleBlock = true;
+    if (!recognisePass(part, models, settings, watch, fast, out, error)) return false;
+    double w = width, h = height;
+    for (auto& line : out->observations) {
+      Rect& box = line.boundingBox;
+      double top = region.y + (1 - box.origin.y - box.size.height) * region.h;
+      box =
+          Rect((region.x + box.origin.x * region.w) / w, 1 - (top + box.size.height * region.h) / h,
+               box.size.width * region.w / w, box.size.height * region.h / h);
+    }
+    return true;
+  }
+
+  // Blocks read as near garbage (a transcript's column of line numbers, which the
+  // engine takes for vertical text) are read again on their own as one block of rows;
+  // the new reading replaces the old where it is clearly more confident. False with
+  // *error only when the recognition is stopped.
+  bool rereadWeakBlocks(const Page& page, const std::string& models, PassSettings settings,
+                        Watch& watch, bool fast, PassResult* result, Error* error) {
+    struct Block {
+      std::size_t first = 0, count = 0;
+      double characters = 0, weight = 0;
+      Rect box;
+    };
+    std::vector<Block> blocks;
+    const auto& observations = result->observations;
+    for (std::size_t i = 0; i < observations.size(); ++i) {
+      if (blocks.empty() || observations[i].block != observations[blocks.back().first].block) {
+        blocks.push_back({i, 0, 0, 0, observations[i].boundingBox});
+      }
+      Block& block = blocks.back();
+      double characters = static_cast<double>(observations[i].candidates[0].string.size());
+      ++block.count;
+      block.characters += characters;
+      block.weight += characters * observations[i].candidates[0].confidence;
+      block.box = rectUnion(block.box, observations[i].boundingBox);
+    }
+    double width = pixGetWidth(page.pix), height = pixGetHeight(page.pix);
+    bool changed = false;
+    std::vector<RecognizedTextObservation> merged;
+    std::size_t copied = 0;
+    for (const Block& block : blocks) {
+      double confidence = block.characters > 0 ? block.weight / block.characters : 0;
+      if (confidence >= kWeakBlockConfidence ||
+          block.box.size.width * block.box.size.height > kMaxWeakBlockShare) {
+        continue;
+      }
+      tesseract_backend::PageBox region{
+          std::max(0, static_cast<int>(block.box.origin.x * width) - kRegionMargin),
+          std::max(0, static_cast<int>((1 - block.box.origin.y - block.box.size.height) * height) -
+                          kRegionMargin),
+          static_cast<int>(block.box.size.width * width) + 2 * kRegionMargin,
+          static_cast<int>(block.box.size.height * height) + 2 * kRegionMargin};
+      PassResult again;
+      Error failure;
+      if (!readRegion(page, region, models, settings, watch, fast, &again, &failure)) {
+        if (failure.code == TextRecognitionErrorCancelled ||
+            failure.code == TextRecognitionErrorTimedOut) {
+          *error = failure;
+          return false;
+        }
+        continue;
+      }
+      if (again.observations.empty() || again.meanConfidence() < confidence + kWeakBlockGain) {
+        continue;
+      }
+      merged.insert(merged.end(), observations.begin() + static_cast<std::ptrdiff_t>(copied),
+                    observations.begin() + static_cast<std::ptrdiff_t>(block.first));
+      for (auto& line : again.observations) {
+        line.block = observations[block.first].block;
+        line.paragraph = observations[block.first].paragraph;
+        merged.push_back(std::move(line));
+      }
+      copied = block.first + block.count;
+      changed = true;
+    }
+    if (!changed) return true;
+    merged.insert(merged.end(), observations.begin() + static_cast<std::ptrdiff_t>(copied),
+                  observations.end());
+    PassResult rebuilt;
+    for (auto& line : merged) {
+      std::string text = toUTF8(line.candidates[0].string);
+      auto characters = static_cast<double>(
+          std::count_if(text.begin(), text.end(), [](char c) { return c != ' '; }));
+      rebuilt.characters += characters;
+      rebuilt.weight += characters * line.candidates[0].confidence;
+      rebuilt.text += text + "\n";
+      rebuilt.observations.push_back(std::move(line));
+    }
+    *result = std::move(rebuilt);
+    return true;
+  }
+
+  // Text the page shows that no line covers (a column of line numbers or prices the
+  // segmentation dropped) is read again region by region, each as one block; a
+  // region's confident lines that overlap no line already read are added as blocks of
+  // their own. False with *error only when the recognition is stopped.
+  bool readMissedRegions(const Page& page, const std::string& models, PassSettings settings,
+                         Watch& watch, bool fast, PassResult* result, Error* error) {
+    using tesseract_backend::PageBox;
+    double width = pixGetWidth(page.pix), height = pixGetHeight(page.pix);
+    auto pixels = [&](const Rect& box) {
+      return PageBox{static_cast<int>(box.origin.x * width),
+                     static_cast<int>((1 - box.origin.y - box.size.height) * height),
+                     static_cast<int>(box.size.width * width),
+                     static_cast<int>(box.size.height * height)};
+    };
+    std::vector<PageBox> lines;
+    for (const auto& line : result->observations) lines.push_back(pixels(line.boundingBox));
+    std::vector<PageBox> missed;
+    for (const auto& c : page.characters) {
+      int cx = c.x + c.w / 2, cy = c.y + c.h / 2;
+      bool covered = std::any_of(lines.begin(), lines.end(), [&](const PageBox& l) {
+        return cx >= l.x - kCoverMargin && cx < l.x + l.w + kCoverMargin &&
+               cy >= l.y - kCoverMargin && cy < l.y + l.h + kCoverMargin;
+      });
+      if (!covered) missed.push_back(c);
+    }
+    if (missed.size() < kMinMissedCharacters || missed.size() > kMaxMissedCharacters) return true;
+    std::vector<int> heights;
+    for (const auto& c : missed) heights.push_back(c.h);
+    std::nth_element(heights.begin(), heights.begin() + heights.size() / 2, heights.end());
+    int h = std::max(1, heights[heights.size() / 2]);
+    // Clusters: characters close enough to be a word, a line, or a column of short lines.
+    std::vector<std::size_t> parent(missed.size());
+    for (std::size_t i = 0; i < parent.size(); ++i) parent[i] = i;
+    auto root = [&](std::size_t i) {
+      while (parent[i] != i) i = parent[i] = parent[parent[i]];
+      return i;
+    };
+    for (std::size_t i = 0; i < missed.size(); ++i) {
+      for (std::size_t j = i + 1; j < missed.size(); ++j) {
+        const PageBox &a = missed[i], &b = missed[j];
+        int xGap = std::max(a.x, b.x) - std::min(a.x + a.w, b.x + b.w);
+        int yGap = std::max(a.y, b.y) - std::min(a.y + a.h, b.y + b.h);
+        if (xGap < kClusterXGap * h && yGap < kClusterYGap * h) parent[root(j)] = root(i);
+      }
+    }
+    // Only clusters of characters about as high as the page's text: a picture's specks
+    // vary, and a picture read as text is garbage.
+    std::vector<double> pageHeights;
+    for (const auto& c : page.characters) pageHeights.push_back(c.h);
+    std::nth_element(pageHeights.begin(), pageHeights.begin() + pageHeights.size() / 2,
+                     pageHeights.end());
+    double textHeight = pageHeights[pageHeights.size() / 2];
+    std::map<std::size_t, std::vector<int>> clusterHeights;
+    for (std::size_t i = 0; i < missed.size(); ++i) clusterHeights[root(i)].push_back(missed[i].h);
+    std::map<std::size_t, std::pair<PageBox, std::size_t>> clusters;
+    for (std::size_t i = 0; i < missed.size(); ++i) {
+      auto [it, fresh] = clusters.try_emplace(root(i), missed[i], 0);
+      PageBox& box = it->second.first;
+      if (!fresh) {
+        int right = std::max(box.x + box.w, missed[i].x + missed[i].w);
+        int bottom = std::max(box.y + box.h, missed[i].y + missed[i].h);
+        box.x = std::min(box.x, missed[i].x);
+        box.y = std::min(box.y, missed[i].y);
+        box.w = right - box.x;
+        box.h = bottom - box.y;
+      }
+      ++it->second.second;
+    }
+    std::size_t nextBlock = 0, nextParagraph = 0;
+    for (const auto& line : result->observations) {
+      nextBlock = std::max(nextBlock, line.block + 1);
+      nextParagraph = std::max(nextParagraph, line.paragraph + 1);
+    }
+    int regions = 0;
+    for (const auto& [key, cluster] : clusters) {
+      const auto& [box, count] = cluster;
+      auto& ownHeights = clusterHeights[key];
+      std::nth_element(ownHeights.begin(), ownHeights.begin() + ownHeights.size() / 2,
+                       ownHeights.end());
+      double ownHeight = ownHeights[ownHeights.size() / 2];
+      if (ownHeight < kMinClusterHeight * textHeight ||
+          ownHeight > kMaxClusterHeight * textHeight) {
+        continue;
+      }
+      if (count < kMinMissedCharacters || regions == kMaxMissedRegions ||
+          static_cast<double>(box.w) * box.h > kMaxWeakBlockShare * width * height) {
+        continue;
+      }
+      ++regions;
+      int margin = h / 2 + kRegionMargin;
+      PageBox region{std::max(0, box.x - margin), std::max(0, box.y - margin), box.w + 2 * margin,
+                     box.h + 2 * margin};
+      PassResult again;
+      Error failure;
+      if (!readRegion(page, region, models, settings, watch, fast, &again, &failure)) {
+        if (failure.code == TextRecognitionErrorCancelled ||
+            failure.code == TextRecognitionErrorTimedOut) {
+          *error = failure;
+          return false;
+        }
+        continue;
+      }
+      if (again.meanConfidence() < kMissedConfidence) continue;
+      bool added = false;
+      for (auto& line : again.observations) {
+        PageBox l = pixels(line.boundingBox);
+        bool overlaps = std::any_of(lines.begin(), lines.end(), [&](const PageBox& o) {
+          int w = std::min(l.x + l.w, o.x + o.w) - std::max(l.x, o.x);
+          int hh = std::min(l.y + l.h, o.y + o.h) - std::max(l.y, o.y);
+          return w > 0 && hh > 0 && static_cast<double>(w) * hh > kMaxOverlap * l.w * l.h;
+        });
+        if (overlaps) continue;
+        std::string text = toUTF8(line.candidates[0].string);
+        auto characters = static_cast<double>(
+            std::count_if(text.begin(), text.end(), [](char ch) { return ch != ' '; }));
+        result->characters += characters;
+        result->weight += characters * line.candidates[0].confidence;
+        result->text += text + "\n";
+        line.block = nextBlock;
+        line.paragraph = nextParagraph;
+        lines.push_back(l);
+        result->observations.push_back(std::move(line));
+        added = true;
+      }
+      if (added) ++nextBlock, ++nextParagraph;
+    }
+    return true;
+  }
+
   static void collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult* out) {
     std::unique_ptr<tesseract::ResultIterator> results(api.GetIterator());
     if (!results) return;
@@ -613,6 +874,7 @@ std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recog
     PIX* turned = pixRotateOrth(page.pix, orientation.rotateQuadrants);
     if (turned) {
       page.replace(turned);
+      page.characters.clear();
       turnedFirst = true;
     }
   }
@@ -687,6 +949,10 @@ std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recog
     if (!tryAnother(page, rows, kBetterWeight, -1, &kept)) return std::nullopt;
   }
   if (mayTurn && !orientationAsked && judge(result, plan) == Reading::Unreadable && !tryTurning()) {
+    return std::nullopt;
+  }
+  if (!impl.rereadWeakBlocks(page, models, settings, watch, fast, &result, error) ||
+      !impl.readMissedRegions(page, models, settings, watch, fast, &result, error)) {
     return std::nullopt;
   }
   if (!detect) return std::move(result.observations);

@@ -44,7 +44,7 @@ using nlohmann::json;
 struct Options {
   std::vector<std::string> languages;
   bool fast = false;
-  RVReadingOrder order = RVReadingOrderEngine;
+  RVReadingOrder order = RVReadingOrderRows;
   double timeout = 0;
   bool json = false;
   std::string overlay;
