@@ -268,6 +268,7 @@ class CORVEL_EXPORT TesseractRecognizer final : public TextRecognizer {
   struct Impl;
 
  private:
+  class PageRecognition;
   explicit TesseractRecognizer(std::unique_ptr<Impl> impl);
   std::unique_ptr<Impl> impl_;
 };

@@ -47,9 +47,6 @@ constexpr LanguageModel kAliases[] = {{"yue-Hans", "chi_sim"}, {"yue-Hant", "chi
 // What a page reads with when its script cannot be trusted.
 constexpr const char* kLatinModels[] = {"eng", "fra", "deu", "ita", "por", "spa"};
 
-// Orientation and script detection below these confidences is a guess.
-constexpr float kMinOrientationConfidence = 2.0f;
-constexpr float kMinScriptConfidence = 1.0f;
 // A page read with a detected script's model whose lines average less than this is read
 // again with the Latin languages.
 constexpr double kMinDetectedConfidence = 0.75;
@@ -230,177 +227,232 @@ bool isStop(const Error& error) {
 
 }  // namespace
 
-std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recognize(
-    const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) {
-  keepEngineOnThisThread();
-  Impl& impl = *impl_;
-  bool fast = request.recognitionLevel() == TextRecognitionLevelFast;
-  bool detect = request.recognitionLanguages().empty() && request.automaticallyDetectsLanguage();
+// One request on one page: the page prepared from its measures, a first reading, the
+// readings that follow only where the first reads poorly, and, for detection, the
+// language's own model. Each step answers false with *error_ when it cannot go on.
+class TesseractRecognizer::PageRecognition {
+ public:
+  PageRecognition(Impl& impl, const TextRecognitionRequest& request, Error* error)
+      : impl_(impl),
+        request_(request),
+        error_(error),
+        fast_(request.recognitionLevel() == TextRecognitionLevelFast),
+        detect_(request.recognitionLanguages().empty() && request.automaticallyDetectsLanguage()) {}
 
-  std::string models = "eng";
-  if (!request.recognitionLanguages().empty() &&
-      !impl.modelsForCodes(request.recognitionLanguages(), &models, error)) {
-    return std::nullopt;
-  }
-  Page page = preparePage(bitmap);
-  bool prepared = page.pix && (!fast || capLongSide(page, impl.options.fastMaxLongSide));
-  PagePlan plan;
-  if (prepared) {
-    PlanLimits limits =
-        fast ? PlanLimits{kFastEnlargeBelow, kFastEnlargeTo, 0, impl.options.fastMaxLongSide}
-             : PlanLimits{kEnlargeBelow, kEnlargeTo, 0, kMaxScaledLongSide};
-    plan = planPage(measurePage(page.pix), page.fileResolution, limits);
-    prepared = applyPlan(page, plan);
-  }
-  if (!prepared) {
-    *error = makeTextRecognitionError(TextRecognitionErrorImageUnreadable,
-                                      "the image could not be prepared for recognition");
-    return std::nullopt;
-  }
-
-  Watch watch;
-  watch.request = &request;
-  double megapixels = static_cast<double>(pixGetWidth(page.pix)) * pixGetHeight(page.pix) / 1e6;
-  watch.seconds = request.timeout() > 0
-                      ? request.timeout()
-                      : std::max(impl.options.minTimeoutSeconds,
-                                 impl.options.timeoutSecondsPerMegapixel * megapixels);
-  watch.deadline = std::chrono::steady_clock::now() +
-                   std::chrono::duration_cast<std::chrono::steady_clock::duration>(
-                       std::chrono::duration<double>(watch.seconds));
-  auto read = [&](const Page& p, const std::string& m, PassSettings settings, PassResult* out,
-                  Error* e) {
-    return impl.reader.recognisePass(p, m, settings, watch, fast, out, e);
-  };
-
-  // Detection needs the script before the first reading; otherwise orientation is only
-  // asked about a page that reads poorly upright, or whose characters lie on their side.
-  PageReader::Orientation orientation;
-  bool orientationAsked = false;
-  std::string latin = impl.latinModels();
-  bool scriptTrusted = false;
-  bool enoughForOrientation =
-      std::min(pixGetWidth(page.pix), pixGetHeight(page.pix)) >= kMinOrientationSide;
-  // The fast level turns only pages whose characters lie on their side: the detector
-  // costs less than reading such a page as it lies.
-  bool mayTurn = (!fast || detect) && enoughForOrientation;
-  bool sideways = enoughForOrientation && plan.sideways;
-  if (detect || sideways) {
-    orientation = impl.reader.detectOrientation(page, error);
-    orientationAsked = true;
-  }
-  bool turnedFirst = false;
-  if (sideways && orientation.rotateQuadrants % 2 == 1) {
-    PIX* turned = pixRotateOrth(page.pix, orientation.rotateQuadrants);
-    if (turned) {
-      page.replace(turned);
-      page.characters.clear();
-      turnedFirst = true;
-    }
-  }
-  if (detect) {
-    std::string scriptModel = modelForScript(orientation.script);
-    scriptTrusted = !scriptModel.empty() && impl.isInstalled(scriptModel);
-    models = scriptTrusted ? scriptModel : latin;
-    if (models.empty()) models = modelForCode(impl.installedCodes.front());
-  }
-
-  PassResult result;
-  PassSettings settings{plan.threshold, false, plan.lightText};
-  if (!read(page, models, settings, &result, error)) {
-    // Specks the adaptive threshold made of a background: read as the engine would
-    // by default.
-    if (watch.stop != Stop::Overgrown || settings.threshold == Threshold::Otsu) {
+  std::optional<std::vector<RecognizedTextObservation>> run(const Bitmap& bitmap) {
+    if (!chooseModels() || !prepare(bitmap)) return std::nullopt;
+    startWatch();
+    if (!orient() || !readFirst() || !lookAgain() || !readLanguage()) return std::nullopt;
+    if (!impl_.reader.rereadWeakBlocks(page_, models_, settings_, watch_, fast_, &result_,
+                                       error_) ||
+        !impl_.reader.readMissedRegions(page_, models_, settings_, watch_, fast_, &result_,
+                                        error_)) {
       return std::nullopt;
     }
-    settings.threshold = Threshold::Otsu;
-    plan.alternativeWorthTrying = false;
-    if (!read(page, models, settings, &result, error)) return std::nullopt;
+    return std::move(result_.observations);
   }
+
+ private:
+  bool chooseModels() {
+    models_ = "eng";
+    return request_.recognitionLanguages().empty() ||
+           impl_.modelsForCodes(request_.recognitionLanguages(), &models_, error_);
+  }
+
+  bool prepare(const Bitmap& bitmap) {
+    page_ = preparePage(bitmap);
+    bool prepared = page_.pix && (!fast_ || capLongSide(page_, impl_.options.fastMaxLongSide));
+    if (prepared) {
+      PlanLimits limits =
+          fast_ ? PlanLimits{kFastEnlargeBelow, kFastEnlargeTo, 0, impl_.options.fastMaxLongSide}
+                : PlanLimits{kEnlargeBelow, kEnlargeTo, 0, kMaxScaledLongSide};
+      plan_ = planPage(measurePage(page_.pix), page_.fileResolution, limits);
+      prepared = applyPlan(page_, plan_);
+    }
+    if (!prepared) {
+      *error_ = makeTextRecognitionError(TextRecognitionErrorImageUnreadable,
+                                         "the image could not be prepared for recognition");
+    }
+    settings_ = {plan_.threshold, false, plan_.lightText};
+    return prepared;
+  }
+
+  void startWatch() {
+    watch_.request = &request_;
+    double megapixels = static_cast<double>(pixGetWidth(page_.pix)) * pixGetHeight(page_.pix) / 1e6;
+    watch_.seconds = request_.timeout() > 0
+                         ? request_.timeout()
+                         : std::max(impl_.options.minTimeoutSeconds,
+                                    impl_.options.timeoutSecondsPerMegapixel * megapixels);
+    watch_.deadline = std::chrono::steady_clock::now() +
+                      std::chrono::duration_cast<std::chrono::steady_clock::duration>(
+                          std::chrono::duration<double>(watch_.seconds));
+  }
+
+  bool read(const Page& page, const std::string& models, PassSettings settings, PassResult* out,
+            Error* error) {
+    return impl_.reader.recognisePass(page, models, settings, watch_, fast_, out, error);
+  }
+
+  // Detection needs the script before the first reading, and a page whose characters
+  // lie on their side is read turned first, as the detector says (even at the fast
+  // level: the detector costs less than reading such a page as it lies). Otherwise
+  // orientation is only asked about a page that reads poorly.
+  bool orient() {
+    bool enough = std::min(pixGetWidth(page_.pix), pixGetHeight(page_.pix)) >= kMinOrientationSide;
+    mayTurn_ = (!fast_ || detect_) && enough;
+    bool sideways = enough && plan_.sideways;
+    if (detect_ || sideways) askOrientation();
+    if (sideways && orientation_.rotateQuadrants % 2 == 1) {
+      if (PIX* turned = pixRotateOrth(page_.pix, orientation_.rotateQuadrants)) {
+        page_.replace(turned);
+        page_.characters.clear();
+        turnedFirst_ = true;
+      }
+    }
+    if (detect_) {
+      latin_ = impl_.latinModels();
+      std::string scriptModel = modelForScript(orientation_.script);
+      scriptTrusted_ = !scriptModel.empty() && impl_.isInstalled(scriptModel);
+      models_ = scriptTrusted_ ? scriptModel : latin_;
+      if (models_.empty()) models_ = modelForCode(impl_.installedCodes.front());
+    }
+    return true;
+  }
+
+  void askOrientation() {
+    if (orientationAsked_) return;
+    orientation_ = impl_.reader.detectOrientation(page_, error_);
+    orientationAsked_ = true;
+  }
+
+  bool readFirst() {
+    if (read(page_, models_, settings_, &result_, error_)) return true;
+    // Specks the adaptive threshold made of a background: read as the engine would by
+    // default.
+    if (watch_.stop != Stop::Overgrown || settings_.threshold == Threshold::Otsu) return false;
+    settings_.threshold = Threshold::Otsu;
+    plan_.alternativeWorthTrying = false;
+    return read(page_, models_, settings_, &result_, error_);
+  }
+
   // Another reading of `candidate` with `tried`, kept when its confidence-weighted
-  // characters beat the best so far by `factor` (and its mean confidence by `gain`);
+  // characters beat the best so far by `factor` and its mean confidence by `gain`;
   // false only when the recognition was stopped.
-  auto tryAnother = [&](Page& candidate, PassSettings tried, double factor, double gain,
-                        bool* kept) {
+  bool tryAnother(const Page& candidate, PassSettings tried, double factor, double gain,
+                  bool* kept) {
     *kept = false;
     PassResult other;
     Error failure;
-    if (!read(candidate, models, tried, &other, &failure)) {
+    if (!read(candidate, models_, tried, &other, &failure)) {
       if (!isStop(failure)) return true;
-      *error = failure;
+      *error_ = failure;
       return false;
     }
-    if (other.weight > factor * result.weight &&
-        other.meanConfidence() > result.meanConfidence() + gain) {
-      result = std::move(other);
-      settings = tried;
+    if (other.weight > factor * result_.weight &&
+        other.meanConfidence() > result_.meanConfidence() + gain) {
+      result_ = std::move(other);
+      settings_ = tried;
       *kept = true;
     }
     return true;
-  };
-  // A page is turned only when it reads poorly as it is, the detector is sure of
-  // another orientation, and turned it reads clearly better: short codes in a table or
-  // a receipt's columns fool the detector often enough. A page read turned first is
+  }
+
+  // A page is turned only when it reads poorly as it is, the detector is sure of another
+  // orientation, and turned it reads clearly better: short codes in a table or a
+  // receipt's columns fool the detector often enough. A page read turned first is
   // compared with its untouched self in the same way.
-  auto tryTurning = [&] {
-    if (!orientationAsked) orientation = impl.reader.detectOrientation(page, error);
-    orientationAsked = true;
-    int quadrants = turnedFirst ? 4 - orientation.rotateQuadrants : orientation.rotateQuadrants;
+  bool tryTurning() {
+    askOrientation();
+    int quadrants = turnedFirst_ ? 4 - orientation_.rotateQuadrants : orientation_.rotateQuadrants;
     if (quadrants % 4 == 0) return true;
     Page turned;
-    turned.replace(pixRotateOrth(page.pix, quadrants));
-    turned.resolution = page.resolution;
+    turned.replace(pixRotateOrth(page_.pix, quadrants));
+    turned.resolution = page_.resolution;
     bool kept = false;
     if (!turned.pix) return true;
-    if (!tryAnother(turned, settings, kTurnedWeight, kTurnedConfidenceGain, &kept)) return false;
-    if (kept) page = std::move(turned);
+    if (!tryAnother(turned, settings_, kTurnedWeight, kTurnedConfidenceGain, &kept)) return false;
+    if (kept) page_ = std::move(turned);
     return true;
-  };
-  bool kept = false;
-  if (mayTurn && judge(result, plan) == Reading::Unreadable && !tryTurning()) return std::nullopt;
-  if (plan.alternativeWorthTrying && judge(result, plan) != Reading::Good) {
-    PassSettings other = settings;
-    other.threshold = settings.threshold == Threshold::Otsu ? Threshold::Sauvola : Threshold::Otsu;
-    if (!tryAnother(page, other, kBetterWeight, -1, &kept)) return std::nullopt;
   }
-  if (judge(result, plan) == Reading::Sparse) {
-    PassSettings rows = settings;
-    rows.singleBlock = true;
-    if (!tryAnother(page, rows, kBetterWeight, -1, &kept)) return std::nullopt;
-  }
-  if (mayTurn && !orientationAsked && judge(result, plan) == Reading::Unreadable && !tryTurning()) {
-    return std::nullopt;
-  }
-  if (!impl.reader.rereadWeakBlocks(page, models, settings, watch, fast, &result, error) ||
-      !impl.reader.readMissedRegions(page, models, settings, watch, fast, &result, error)) {
-    return std::nullopt;
-  }
-  if (!detect) return std::move(result.observations);
 
-  if (models.find('+') == std::string::npos) {
-    // The script's model reads the text well enough to tell its language; read again
-    // with that language's own model when it is another one.
-    std::string better = modelForCode(tesseract_backend::identifyLanguage(result.text));
-    if (!better.empty() && better != models && impl.isInstalled(better)) {
-      PassResult second;
-      if (read(page, better, settings, &second, error)) {
-        result = std::move(second);
-      } else if (isStop(*error)) {
-        return std::nullopt;
+  // Only where the reading so far is poor: turned (when it is unreadable), with the
+  // other binarisation, as one block of rows (when it finds far fewer characters than the
+  // page shows), and turned after all.
+  bool lookAgain() {
+    bool kept = false;
+    if (mayTurn_ && judge(result_, plan_) == Reading::Unreadable && !tryTurning()) return false;
+    if (plan_.alternativeWorthTrying && judge(result_, plan_) != Reading::Good) {
+      PassSettings other = settings_;
+      other.threshold =
+          settings_.threshold == Threshold::Otsu ? Threshold::Sauvola : Threshold::Otsu;
+      if (!tryAnother(page_, other, kBetterWeight, -1, &kept)) return false;
+    }
+    if (judge(result_, plan_) == Reading::Sparse) {
+      PassSettings rows = settings_;
+      rows.singleBlock = true;
+      if (!tryAnother(page_, rows, kBetterWeight, -1, &kept)) return false;
+    }
+    if (mayTurn_ && !orientationAsked_ && judge(result_, plan_) == Reading::Unreadable) {
+      return tryTurning();
+    }
+    return true;
+  }
+
+  // Detection: the script's model reads the text well enough to tell its language; the
+  // page is read again with that language's own model when it is another one, and with
+  // the Latin languages when a weak script verdict read poorly.
+  bool readLanguage() {
+    if (!detect_) return true;
+    if (models_.find('+') == std::string::npos) {
+      std::string better = modelForCode(tesseract_backend::identifyLanguage(result_.text));
+      if (!better.empty() && better != models_ && impl_.isInstalled(better)) {
+        PassResult second;
+        Error failure;
+        if (read(page_, better, settings_, &second, &failure)) {
+          result_ = std::move(second);
+          models_ = better;
+        } else if (isStop(failure)) {
+          *error_ = failure;
+          return false;
+        }
       }
     }
-  }
-  if (scriptTrusted && result.meanConfidence() < kMinDetectedConfidence && !latin.empty() &&
-      latin != models) {
-    // A weak script verdict that read poorly: the page may be Latin after all.
-    PassResult fallback;
-    if (read(page, latin, settings, &fallback, error)) {
-      if (fallback.meanConfidence() > result.meanConfidence()) result = std::move(fallback);
-    } else if (isStop(*error)) {
-      return std::nullopt;
+    if (scriptTrusted_ && result_.meanConfidence() < kMinDetectedConfidence && !latin_.empty() &&
+        latin_ != models_) {
+      PassResult fallback;
+      Error failure;
+      if (read(page_, latin_, settings_, &fallback, &failure)) {
+        if (fallback.meanConfidence() > result_.meanConfidence()) {
+          result_ = std::move(fallback);
+          models_ = latin_;
+        }
+      } else if (isStop(failure)) {
+        *error_ = failure;
+        return false;
+      }
     }
+    return true;
   }
-  return std::move(result.observations);
+
+  Impl& impl_;
+  const TextRecognitionRequest& request_;
+  Error* error_;
+  bool fast_, detect_;
+  std::string models_, latin_;
+  Page page_;
+  PagePlan plan_;
+  PassSettings settings_;
+  Watch watch_;
+  PassResult result_;
+  PageReader::Orientation orientation_;
+  bool orientationAsked_ = false, turnedFirst_ = false, mayTurn_ = false, scriptTrusted_ = false;
+};
+
+std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recognize(
+    const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) {
+  keepEngineOnThisThread();
+  return PageRecognition(*impl_, request, error).run(bitmap);
 }
 
 std::uint32_t TesseractRecognizer::maxUsefulLongSide(const TextRecognitionRequest& request) const {
