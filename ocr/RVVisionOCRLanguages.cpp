@@ -6,6 +6,7 @@
 #include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/Log.h"
 #include "Corvelbase/platform/Platform.h"
+#include "platform/RecognitionLanguages.h"
 
 namespace corvel {
 
@@ -21,32 +22,6 @@ constexpr const char* kEnglish = "en-US";
 // Fast recognition is refused for this code (the check is made twice over the same
 // code, so Traditional Chinese is never refused).
 constexpr const char* kNoFastCode = "zh-Hans";
-
-struct CatalogueRow {
-  const char* key;
-  const char* isoCode;
-  const char* name;
-  bool eastAsian;  // has "secondary" = [en-US] and "forcePrimary"
-};
-
-// The Cantonese rows carry the Chinese codes and "Ukranian" keeps its spelling: hosts
-// match on both.
-constexpr CatalogueRow kCatalogue[] = {
-    {"zh-Hans", "zh-Hans", "Chinese Simplified", true},
-    {"zh-Hant", "zh-Hant", "Chinese Traditional", true},
-    {"yue-Hans", "zh-Hans", "Cantonese Simplified", true},
-    {"yue-Hant", "zh-Hant", "Cantonese Traditional", true},
-    {"ja-JP", "ja-JP", "Japanese", true},
-    {"ko-KR", "ko-KR", "Korean", true},
-    {"en-US", "en-US", "English", false},
-    {"fr-FR", "fr-FR", "French", false},
-    {"de-DE", "de-DE", "German", false},
-    {"it-IT", "it-IT", "Italian", false},
-    {"pt-BR", "pt-BR", "Portuguese", false},
-    {"es-ES", "es-ES", "Spanish", false},
-    {"ru-RU", "ru-RU", "Russian", false},
-    {"uk-UA", "uk-UA", "Ukranian", false},
-};
 
 const PropertyList::Dictionary* entryFor(const std::string& code) {
   const auto& catalogue = RVVisionOCR::allVisionLanguages();
@@ -71,7 +46,7 @@ const PropertyList::Dictionary& RVVisionOCR::allVisionLanguages() {
   static const PropertyList::Dictionary* catalogue = nullptr;
   std::call_once(once, [] {
     auto* built = new PropertyList::Dictionary;  // lives for the whole process
-    for (const auto& row : kCatalogue) {
+    for (const auto& row : detail::recognitionLanguages()) {
       PropertyList::Dictionary entry;
       entry[RVVisionLanguageIsoCodeKey] = PropertyList(fromUTF8(row.isoCode));
       entry[RVVisionLanguageNameKey] = PropertyList(fromUTF8(row.name));
@@ -80,7 +55,7 @@ const PropertyList::Dictionary& RVVisionOCR::allVisionLanguages() {
             PropertyList(PropertyList::Array{PropertyList(fromUTF8(kEnglish))});
         entry[RVVisionLanguageForcePrimaryKey] = PropertyList(true);
       }
-      (*built)[row.key] = PropertyList(std::move(entry));
+      (*built)[row.code] = PropertyList(std::move(entry));
     }
     catalogue = built;
   });

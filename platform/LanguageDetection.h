@@ -35,6 +35,11 @@ std::unique_ptr<LanguageIdentifier> makeCld2Identifier();
 // models cannot be loaded.
 std::unique_ptr<LanguageIdentifier> makeTextcatIdentifier();
 
+// CLD2's answer for UTF-8 text only when it calls the answer reliable (for choosing a
+// recognition model from a first reading, where a guess would do harm); nullopt
+// otherwise and for invalid UTF-8. Re-entrant.
+std::optional<std::string> identifyReliably(std::string_view utf8);
+
 // The tokenizer's role (CLD2). Invalid UTF-16 (unpaired surrogates) is read as U+FFFD.
 std::optional<std::string> bestStringLanguage(std::u16string_view text);
 

@@ -208,9 +208,8 @@ class CORVEL_EXPORT ImageRequestHandler {
 // engine took for words; its paragraph step costs their square), each checked by the
 // engine's progress monitor while it recognises.
 //
-// Languages: codes map to Tesseract's models (en-US eng, fr-FR fra, de-DE deu, it-IT ita,
-// pt-BR por, es-ES spa, ru-RU rus, uk-UA ukr, zh-Hans chi_sim, zh-Hant chi_tra, ja-JP jpn,
-// ko-KR kor; the Cantonese codes yue-Hans and yue-Hant use the Chinese models). A code
+// Languages: every code of the recognition language catalogue reads with a Tesseract
+// model (modelForLanguageCode; the Cantonese codes with the Chinese ones). A code
 // without a model, or whose model is not installed, fails the recognition with
 // TextRecognitionErrorUnsupportedLanguage. With automatic detection and no codes, the
 // script is detected first, the page read with that script's model, the language

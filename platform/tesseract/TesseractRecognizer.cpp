@@ -8,8 +8,9 @@
 #include <thread>
 
 #include "Corvelbase/platform/TextRecognizer.h"
+#include "platform/LanguageDetection.h"
+#include "platform/RecognitionLanguages.h"
 #include "platform/image/BitmapNative.h"
-#include "platform/tesseract/LanguageIdentification.h"
 #include "platform/tesseract/PageReader.h"
 
 namespace corvel {
@@ -32,20 +33,6 @@ using tesseract_backend::Watch;
 namespace {
 
 constexpr const char* kDebianDataPath = "/usr/share/tesseract-ocr/5/tessdata";
-
-struct LanguageModel {
-  const char* code;
-  const char* model;
-};
-// Our supported languages, in the order we report them.
-constexpr LanguageModel kLanguages[] = {
-    {"en-US", "eng"},       {"fr-FR", "fra"},       {"de-DE", "deu"}, {"it-IT", "ita"},
-    {"pt-BR", "por"},       {"es-ES", "spa"},       {"ru-RU", "rus"}, {"uk-UA", "ukr"},
-    {"zh-Hans", "chi_sim"}, {"zh-Hant", "chi_tra"}, {"ja-JP", "jpn"}, {"ko-KR", "kor"}};
-// Codes a caller may also send; they read with the models of the written language.
-constexpr LanguageModel kAliases[] = {{"yue-Hans", "chi_sim"}, {"yue-Hant", "chi_tra"}};
-// What a page reads with when its script cannot be trusted.
-constexpr const char* kLatinModels[] = {"eng", "fra", "deu", "ita", "por", "spa"};
 
 // A page read with a detected script's model whose lines average less than this is read
 // again with the Latin languages.
@@ -103,11 +90,8 @@ void keepEngineOnThisThread() {
 }
 
 std::string modelForCode(const std::string& code) {
-  for (const auto& entry : kLanguages)
-    if (code == entry.code) return entry.model;
-  for (const auto& entry : kAliases)
-    if (code == entry.code) return entry.model;
-  return "";
+  const auto* language = detail::recognitionLanguage(code);
+  return language ? language->model : "";
 }
 
 std::string join(const std::vector<std::string>& models) {
@@ -154,8 +138,13 @@ struct TesseractRecognizer::Impl {
         reader(std::move(dataPath), o.maxIdleModelBytes,
                o.maxConcurrentRecognitions ? o.maxConcurrentRecognitions
                                            : std::max(1u, std::thread::hardware_concurrency())) {
-    for (const auto& entry : kLanguages) {
-      if (isInstalled(entry.model)) installedCodes.push_back(entry.code);
+    // Reported as the recogniser always has: the Latin and Cyrillic languages first.
+    for (bool eastAsian : {false, true}) {
+      for (const auto& language : detail::recognitionLanguages()) {
+        if (language.eastAsian == eastAsian && !language.isAlias() && isInstalled(language.model)) {
+          installedCodes.push_back(language.code);
+        }
+      }
     }
     available = !installedCodes.empty();
   }
@@ -181,10 +170,11 @@ struct TesseractRecognizer::Impl {
     return true;
   }
 
+  // What a page reads with when its script cannot be trusted: the Latin languages.
   std::string latinModels() const {
     std::vector<std::string> list;
-    for (const char* model : kLatinModels)
-      if (isInstalled(model)) list.push_back(model);
+    for (const auto& language : detail::recognitionLanguages())
+      if (language.latin && isInstalled(language.model)) list.push_back(language.model);
     return list.empty() ? "" : join(list);
   }
 };
@@ -405,7 +395,10 @@ class TesseractRecognizer::PageRecognition {
   bool readLanguage() {
     if (!detect_) return true;
     if (models_.find('+') == std::string::npos) {
-      std::string better = modelForCode(tesseract_backend::identifyLanguage(result_.text));
+      auto identified = detail::identifyReliably(result_.text);
+      const auto* language =
+          identified ? detail::recognitionLanguageIdentifiedAs(*identified) : nullptr;
+      std::string better = language ? language->model : "";
       if (!better.empty() && better != models_ && impl_.isInstalled(better)) {
         PassResult second;
         Error failure;
