@@ -45,37 +45,12 @@ constexpr int kMinOrientationSide = 300;
 constexpr double kEnlargeBelow = 12, kEnlargeTo = 15;
 constexpr double kFastEnlargeBelow = 10, kFastEnlargeTo = 14;
 constexpr std::uint32_t kMaxScaledLongSide = 8000;
-// A reading is poor below this mean confidence, or with fewer characters than this
-// share of the character-like shapes the page shows (when it shows enough to judge).
-constexpr double kPoorConfidence = 0.75, kUnreadableConfidence = 0.5;
-constexpr double kPoorCoverage = 0.6;
-constexpr int kMinCharactersToJudge = 40;
 // A second binarisation is kept when its confidence-weighted characters exceed the
 // first's by this factor; a turned page must beat the upright one by more, and by this
 // much mean confidence.
 constexpr double kBetterWeight = 1.05;
 constexpr double kTurnedWeight = 1.3;
 constexpr double kTurnedConfidenceGain = 0.1;
-// A block (no more than this share of the page) read with less confidence than this is
-// read again on its own, and replaced when that reading gains this much confidence.
-constexpr double kWeakBlockConfidence = 0.5, kWeakBlockGain = 0.25;
-constexpr double kMaxWeakBlockShare = 0.3;
-constexpr int kRegionMargin = 4;
-// Characters the measures saw whose centre lies in no line (widened by this many
-// pixels) were missed; clusters of at least this many (and pages with at most so many
-// missed, past which the page is a picture rather than missed text) are read again, at
-// most this many regions a page, and kept at this confidence, line by line where a
-// line overlaps no line read before by more than this share of its own box.
-constexpr int kCoverMargin = 3;
-constexpr std::size_t kMinMissedCharacters = 4, kMaxMissedCharacters = 600;
-constexpr int kMaxMissedRegions = 8;
-constexpr double kClusterXGap = 1.5, kClusterYGap = 3.0;
-constexpr double kMinClusterHeight = 0.6, kMaxClusterHeight = 1.6;
-constexpr double kMissedConfidence = 0.7;
-constexpr double kMaxOverlap = 0.3;
-// A pass that finds more words than this (at least, and per megapixel) is reading specks.
-constexpr int kMinWordLimit = 20000;
-constexpr double kWordsPerMegapixel = 2500;
 
 // Debian's libtesseract runs its own OpenMP threads (four per parallel region); with
 // several recognitions at once they only compete with each other for the cores and make
