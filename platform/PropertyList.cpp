@@ -33,40 +33,25 @@ double dateFromParts(DateParts parts) {
   return parts.seconds + (parts.seconds < 0 ? -fraction : fraction);
 }
 
-// What libplist gives back for a date it holds as `value`.
-DateParts partsLibplistReads(double value) {
-  auto whole = static_cast<std::int64_t>(value);
-  return {static_cast<std::int32_t>(whole),
-          static_cast<std::int32_t>(std::fabs((value - static_cast<double>(whole)) * 1e6))};
-}
-
 bool dateInRange(double seconds) {
   // Both ends are excluded: libplist's conversions give them for any value beyond.
   return seconds > std::numeric_limits<std::int32_t>::min() &&
          seconds < std::numeric_limits<std::int32_t>::max();
 }
 
-// A date node that libplist reads back as the microsecond nearest to `seconds`;
-// nullptr outside the 32-bit span. libplist adds the microseconds as a double, which
-// can land just below that microsecond and then read back one short: the next
-// microsecond up is tried before giving in.
+// A date node for the microsecond nearest to `seconds`; nullptr outside the 32-bit span.
+// (libplist adds the parts as a double that may fall just short of that microsecond,
+// and then reads it back one microsecond nearer to the reference date.)
 plist_t newDate(double seconds) {
   if (!dateInRange(seconds)) return nullptr;
   auto whole = static_cast<std::int32_t>(seconds);
-  auto micros = static_cast<std::int32_t>(std::lround(std::fabs(seconds - whole) * 1e6));
-  int sign = seconds < 0 ? -1 : 1;
-  if (micros == 1'000'000) {
-    if (!dateInRange(whole + sign)) return nullptr;
-    whole += sign;
+  auto micros = static_cast<std::int32_t>(std::lround((seconds - whole) * 1e6));
+  if (micros == 1'000'000 || micros == -1'000'000) {
+    if (!dateInRange(whole + micros / 1'000'000)) return nullptr;
+    whole += micros / 1'000'000;
     micros = 0;
   }
-  for (std::int32_t nudge : {0, 1}) {
-    std::int32_t signedMicros = sign * (micros + nudge);
-    double held = static_cast<double>(whole) + static_cast<double>(signedMicros) / 1000000;
-    DateParts back = partsLibplistReads(held);
-    if (back.seconds == whole && back.micros == micros) return plist_new_date(whole, signedMicros);
-  }
-  return plist_new_date(whole, sign * micros);
+  return plist_new_date(whole, micros);
 }
 
 // libplist keeps text as C strings: U+0000 cannot be written, and a key must be UTF-8.

@@ -13,11 +13,11 @@
 // libplist, which cannot carry such a key). String values keep every character,
 // U+0000 included.
 //
-// Dates: libplist hands dates over as whole seconds and microseconds (rounded towards
-// zero) in 32 bits, so dates are kept to the microsecond between 1933-12-13 and
-// 2069-01-19; a list holding a date outside that span is refused. A date less than a
-// second before the reference date reads as the same time after it (the sign of the
-// seconds is lost in libplist's interface).
+// Dates: libplist hands dates over as whole seconds and microseconds (both rounded
+// towards zero) in 32 bits, so dates are kept between 1933-12-13 and 2069-01-19, to
+// within a microsecond; a list holding a date outside that span is refused. A date
+// less than a second before the reference date reads as the same time after it (the
+// sign is lost in libplist's interface).
 #pragma once
 
 #include <cstddef>
