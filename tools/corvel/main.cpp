@@ -7,6 +7,7 @@
 #include <thread>
 
 #include "Commands.h"
+#include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
 
@@ -40,7 +41,7 @@ void printLogLine(const std::string& line) {
 // program writes its own messages and progress bar from the main thread, piece by piece.
 // Log lines are therefore handed to the main thread, which writes them between its own
 // writes, never inside one; the commands that run jobs drain the main queue until the
-// jobs are done, and main() drains what is left at the end.
+// jobs are done, and main() drains what is left once the jobs' workers are through.
 void installLogSink() {
   static const std::thread::id mainThread = std::this_thread::get_id();
   PlatformRegistry::setLogSink([](std::string_view line) {
@@ -74,6 +75,9 @@ int main(int argc, char** argv) {
   }
   installLogSink();
   int status = it->second.run(Arguments(argv + 2, argv + argc));
+  // An OCR job's worker logs its failure after handing its completion to the main queue:
+  // let the jobs' operations end, so that every log line is queued before the last drain.
+  if (first == "ocr") RVVisionOCR::ocrQueue()->waitUntilAllOperationsAreFinished();
   MainQueue::drain();
   return status;
 }
