@@ -127,7 +127,7 @@ CORVEL_EXPORT String incrementMarkdownHeader(const String& text, Range range,
 // only when it lies before the end of its line, so a caret at the very end of a last
 // line without a line feed stays where it was while a prefix is removed in front of it:
 // toggling bullets off in "- a" with the caret at 3 gives "a" and the selection (3, 0),
-// in a text of 1 unit. This is the commands' specified behaviour and is kept; a host
+// in a text of 1 unit. This is how the selection rule is defined, and it is kept; a host
 // clamps the selection to the new text's length before selecting it.
 CORVEL_EXPORT String insertAtStartOfLine(const String& text, const String& prefix, Range range,
                                          bool firstLineOnly, Range* replacementRange = nullptr,

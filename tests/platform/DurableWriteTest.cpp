@@ -50,7 +50,7 @@ extern "C" int fsync(int fd) {
 namespace corvel {
 namespace {
 
-// Item 6: the mask was found with umask(0) then umask(mask), so a file another thread
+// Regression: the mask was found with umask(0) then umask(mask), so a file another thread
 // created in between got mode 0666.
 TEST(DurableWrite, PermissionsFollowTheUmaskWithoutChangingIt) {
   testing::TempDir dir;
@@ -69,7 +69,7 @@ TEST(DurableWrite, PermissionsFollowTheUmaskWithoutChangingIt) {
   EXPECT_EQ(st.st_mode & 0777, 0750u);
 }
 
-// Item 7: the rename was not followed by a flush of the directory, so after a power cut
+// Regression: the rename was not followed by a flush of the directory, so after a power cut
 // the new name could be gone.
 TEST(DurableWrite, TheDirectoryIsFlushedAfterTheRename) {
   testing::TempDir dir;

@@ -101,8 +101,8 @@ std::string stderrOf(const std::function<void()>& decode) {
   return text;
 }
 
-// F3: libjpeg's and Leptonica's TIFF reader's messages went to stderr (12,482 lines in
-// four minutes of fuzzing) instead of into the failure reason.
+// Regression: libjpeg's and Leptonica's TIFF reader's messages went to stderr (thousands of lines
+// in four minutes of fuzzing) instead of into the failure reason.
 TEST(Image, DamagedJpegAndTiffSayWhyInTheReasonNotOnStderr) {
   const std::pair<const char*, const char*> cases[] = {
       {"truncated.jpg", "JPEG image is corrupt or truncated (JPEG datastream contains no image)"},

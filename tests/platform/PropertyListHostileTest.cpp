@@ -64,7 +64,7 @@ Bytes date(double seconds) {
   return out;
 }
 
-// F1: libplist asserted (aborting the host) on U+0000 in UTF-16 text.
+// Regression: libplist asserted (aborting the host) on U+0000 in UTF-16 text.
 TEST(PropertyListHostile, NulInUtf16TextIsKeptInValuesAndRefusedInKeys) {
   Bytes nulText{0x62, 0x00, 'a', 0x00, 0x00};  // UTF-16 "a", U+0000
   auto value = PropertyList::deserialize(bplist({nulText}));
@@ -80,7 +80,7 @@ TEST(PropertyListHostile, NulInUtf16TextIsKeptInValuesAndRefusedInKeys) {
   EXPECT_FALSE(KeyedArchive::unarchiveDictionary(bplist({{0xD1, 1, 2}, nulText, {0x51, 'v'}})));
 }
 
-// F2: a key of bytes that are not UTF-8 was kept and then written as a list that could
+// Regression: a key of bytes that are not UTF-8 was kept and then written as a list that could
 // not be read back.
 TEST(PropertyListHostile, KeysThatAreNotUtf8AreRefusedBothWays) {
   std::string why;
@@ -92,7 +92,7 @@ TEST(PropertyListHostile, KeysThatAreNotUtf8AreRefusedBothWays) {
   EXPECT_FALSE(tree.serialize(PropertyList::Format::XML));
 }
 
-// F5: dates were shifted by the Unix epoch's offset both ways, and one past 2038 went
+// Regression: dates were shifted by the Unix epoch's offset both ways, and one past 2038 went
 // through an overflowing int32_t cast.
 TEST(PropertyListHostile, DatesAgreeWithAnotherProgramBothWays) {
   auto theirs =

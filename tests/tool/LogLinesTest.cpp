@@ -9,7 +9,7 @@
 namespace corvel {
 namespace {
 
-// Item 8: the library's log line ("Error: Error Domain=...") from a job's worker thread
+// Regression: the library's log line ("Error: Error Domain=...") from a job's worker thread
 // landed on stderr in the middle of corvel's own message about the same failure. Two hundred
 // failing jobs made that happen several times a run; every line must now be whole.
 TEST(ToolLog, LibraryLogLinesNeverSplitTheProgramsMessages) {
