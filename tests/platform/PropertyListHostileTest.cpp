@@ -90,6 +90,8 @@ TEST(PropertyListHostile, KeysThatAreNotUtf8AreRefusedBothWays) {
   PropertyList tree = PropertyList::Dictionary{{"\x99k", true}};
   EXPECT_FALSE(tree.serialize(PropertyList::Format::Binary));
   EXPECT_FALSE(tree.serialize(PropertyList::Format::XML));
+  EXPECT_FALSE(KeyedArchive::archiveDictionary({{"\x99k", Data{1}}}, &why));
+  EXPECT_EQ(why, "a key is not UTF-8");
 }
 
 // Regression: dates were shifted by the Unix epoch's offset both ways, and one past 2038 went
