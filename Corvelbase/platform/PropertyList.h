@@ -15,7 +15,8 @@
 //
 // Dates: libplist hands dates over as whole seconds and microseconds (both rounded
 // towards zero) in 32 bits, so dates are kept between 1933-12-13 and 2069-01-19, to
-// within a microsecond; a list holding a date outside that span is refused. A date
+// within a microsecond (each pass through libplist may drop one, besides the double's
+// own rounding); a list holding a date outside that span is refused. A date
 // less than a second before the reference date reads as the same time after it (the
 // sign is lost in libplist's interface).
 #pragma once

@@ -1,6 +1,6 @@
 // Property lists: a refusal says why; a list that is read is written in binary (unless
 // its text holds U+0000, which libplist cannot write) and reads back the same, dates to
-// within the microsecond libplist keeps; the XML form reads back too.
+// within the microsecond libplist may drop; the XML form reads back too.
 #include <cmath>
 #include <variant>
 
@@ -31,8 +31,10 @@ bool uid(const PropertyList& value) { return value.uid() != nullptr; }
 bool same(const PropertyList& a, const PropertyList& b) {
   if (a.value().index() != b.value().index()) return false;
   if (auto x = std::get_if<PropertyList::Date>(&a.value())) {
-    auto y = std::get<PropertyList::Date>(b.value());
-    return std::fabs(x->secondsSinceReferenceDate - y.secondsSinceReferenceDate) <= 1.01e-6;
+    // A microsecond, and the double's own rounding (half a microsecond at 2^31 s).
+    double seconds = x->secondsSinceReferenceDate;
+    double other = std::get<PropertyList::Date>(b.value()).secondsSinceReferenceDate;
+    return std::fabs(seconds - other) <= 1e-6 + std::fabs(seconds) * 1e-15;
   }
   if (auto x = std::get_if<double>(&a.value())) {
     double y = std::get<double>(b.value());
