@@ -122,6 +122,13 @@ CORVEL_EXPORT String incrementMarkdownHeader(const String& text, Range range,
 // start); a non-empty selection that starts at a line start keeps that start and grows to
 // take in the prefix; the selection end keeps its distance from the end of its line. A
 // length that would come out negative (an end inside a removed prefix) is 0.
+//
+// CAVEAT: the written selection can lie past the end of the new text. The caret moves
+// only when it lies before the end of its line, so a caret at the very end of a last
+// line without a line feed stays where it was while a prefix is removed in front of it:
+// toggling bullets off in "- a" with the caret at 3 gives "a" and the selection (3, 0),
+// in a text of 1 unit. This is how the selection rule is defined, and it is kept; a host
+// clamps the selection to the new text's length before selecting it.
 CORVEL_EXPORT String insertAtStartOfLine(const String& text, const String& prefix, Range range,
                                          bool firstLineOnly, Range* replacementRange = nullptr,
                                          Range* selectionRange = nullptr);

@@ -172,10 +172,15 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
   // dictionary; such children, and children past kMaxTreeDepth, are skipped.
   static std::shared_ptr<RVRecognitionBlock> createBlockFromInfo(const PropertyList& info);
   static constexpr int kMaxTreeDepth = 64;
+  // Whether the dictionary form nests no deeper than kMaxTreeDepth levels of
+  // "childBlocks" below `info` (what blockInformation writes always does), so that
+  // nothing of it would be cut. Time linear in the tree's size.
+  static bool isWithinTreeDepth(const PropertyList& info);
 
   // The dictionary form in a property-list file (written atomically). Writing fails
   // (false) when the file cannot be written; reading gives nullptr for a missing file,
-  // one that is no property list, or one whose root is not a dictionary.
+  // one that is no property list (see PropertyList's limits), one whose root is not a
+  // dictionary, or one whose tree nests deeper than kMaxTreeDepth.
   bool writeToFile(const std::string& path, PropertyList::Format format) const;
   static std::shared_ptr<RVRecognitionBlock> readFromFile(const std::string& path);
 

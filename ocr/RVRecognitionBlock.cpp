@@ -4,6 +4,8 @@
 #include <cfloat>
 #include <cmath>
 #include <cstdio>
+#include <utility>
+#include <vector>
 
 #include "AssemblyCache.h"
 #include "Corvelbase/platform/Files.h"
@@ -192,9 +194,26 @@ bool RVRecognitionBlock::writeToFile(const std::string& path, PropertyList::Form
   return blockInformation().writeToFile(path, format);
 }
 
+bool RVRecognitionBlock::isWithinTreeDepth(const PropertyList& info) {
+  // Walked with an explicit stack: the dictionary may come from anywhere.
+  std::vector<std::pair<const PropertyList*, int>> pending{{&info, 0}};
+  while (!pending.empty()) {
+    auto [node, depth] = pending.back();
+    pending.pop_back();
+    const PropertyList* children = node->find(kRVBlockChildBlocksKey);
+    if (!children || !children->array()) continue;
+    for (const PropertyList& child : *children->array()) {
+      if (!child.dictionary()) continue;
+      if (depth + 1 > kMaxTreeDepth) return false;
+      pending.emplace_back(&child, depth + 1);
+    }
+  }
+  return true;
+}
+
 std::shared_ptr<RVRecognitionBlock> RVRecognitionBlock::readFromFile(const std::string& path) {
   std::optional<PropertyList> info = PropertyList::readFromFile(path);
-  if (!info) return nullptr;
+  if (!info || !isWithinTreeDepth(*info)) return nullptr;
   return createBlockFromInfo(*info);
 }
 

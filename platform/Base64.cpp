@@ -50,7 +50,9 @@ std::string base64Encoding(const Data& bytes, std::uint32_t options) {
 }
 
 std::optional<Data> base64Decoding(std::string_view text) {
+  if (text.size() > kMaxBase64TextLength) return std::nullopt;
   Data out;
+  out.reserve(text.size() / 4 * 3);
   std::uint32_t acc = 0;
   int bits = 0, symbols = 0, padding = 0;
   for (char c : text) {

@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdio>
 #include <filesystem>
 #include <new>
@@ -188,12 +189,19 @@ std::shared_ptr<FileWrapper> readRecord(Reader& in, int depth) {
   return FileWrapper::initDirectoryWithFileWrappers(children);
 }
 
+bool writeChildren(const FileWrapper& w, const std::string& path);
+
 bool writeTree(const FileWrapper& w, const std::string& path) {
   if (const auto& contents = w.regularFileContents()) return writeFileAtomically(path, *contents);
-  if (mkdir(path.c_str(), 0777) != 0) return false;
+  return mkdir(path.c_str(), 0777) == 0 && writeChildren(w, path);
+}
+
+// Writes the children of directory `w` into the existing directory `path` and flushes
+// its entries.
+bool writeChildren(const FileWrapper& w, const std::string& path) {
   for (const auto& [name, child] : w.fileWrappers())
     if (!writeTree(*child, path + "/" + name)) return false;
-  return true;
+  return syncDirectory(path);
 }
 
 }  // namespace
@@ -275,14 +283,19 @@ bool FileWrapper::writeToPath(const std::string& path) const {
   fs::path target(path);
   while (target.has_relative_path() && target.filename().empty()) target = target.parent_path();
   fs::path parent = target.parent_path().empty() ? fs::path(".") : target.parent_path();
-  std::string staging = (parent / ("." + target.filename().string() + ".XXXXXX")).string();
-  if (!mkdtemp(staging.data())) return false;
-  // mkdtemp makes the directory private; give it what an ordinary mkdir would.
-  mode_t mask = umask(0);
-  umask(mask);
-  bool ok = chmod(staging.c_str(), 0777 & ~mask) == 0;
-  for (const auto& [name, child] : children_)
-    if (ok) ok = writeTree(*child, staging + "/" + name);
+  // A fresh name made with mkdir, which applies the umask as an ordinary mkdir would
+  // (mkdtemp makes it private, and asking umask for the mask changes it process-wide).
+  std::string staging;
+  bool made = false;
+  for (int attempt = 0; !made && attempt < 16; ++attempt) {
+    staging = (parent / ("." + target.filename().string() + "." + makeUUIDString().substr(0, 8) +
+                         std::to_string(attempt)))
+                  .string();
+    made = mkdir(staging.c_str(), 0777) == 0;
+    if (!made && errno != EEXIST) return false;
+  }
+  if (!made) return false;
+  bool ok = writeChildren(*this, staging);
   if (ok) {
     if (!fs::exists(fs::symlink_status(target, ec))) {
       ok = std::rename(staging.c_str(), target.c_str()) == 0;
@@ -292,7 +305,7 @@ bool FileWrapper::writeToPath(const std::string& path) const {
     }
   }
   fs::remove_all(staging, ec);
-  return ok;
+  return ok && syncDirectory(parent.string());
 }
 
 Data FileWrapper::serializedRepresentation() const {

@@ -24,15 +24,34 @@ std::optional<Data> readFile(const std::string& path) {
   return bytes;
 }
 
-bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes, std::size_t size) {
+bool syncDirectory(const std::string& path) {
+  int fd = ::open(path.empty() ? "." : path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (fd < 0) return false;
+  bool ok = fsync(fd) == 0;
+  ::close(fd);
+  return ok;
+}
+
+std::string uniqueSibling(const std::string& path, int attempt) {
   std::filesystem::path target(path);
-  std::filesystem::path dir = target.parent_path();
-  if (dir.empty()) dir = ".";
   // Appended piece by piece: GCC 12 at -O3 misreads "." + string + "..." (-Wrestrict).
   std::string name = ".";
-  name.append(target.filename().string()).append(".XXXXXX");
-  std::string pattern = (dir / name).string();
-  int fd = mkstemp(pattern.data());
+  name.append(target.filename().string()).append(".").append(makeUUIDString(), 0, 8);
+  name.append(std::to_string(attempt));
+  return (target.parent_path() / name).string();
+}
+
+bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes, std::size_t size) {
+  // The temporary file is created with 0666 so that open applies the process's umask
+  // (and a directory's default ACL), as an ordinary write would: asking umask for the
+  // mask would change it for every thread in between.
+  std::string temporary;
+  int fd = -1;
+  for (int attempt = 0; fd < 0 && attempt < 16; ++attempt) {
+    temporary = uniqueSibling(path, attempt);
+    fd = ::open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
+    if (fd < 0 && errno != EEXIST) return false;
+  }
   if (fd < 0) return false;
   bool ok = true;
   std::size_t written = 0;
@@ -44,15 +63,12 @@ bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes, std
     else
       written += static_cast<std::size_t>(n);
   }
-  // mkstemp creates 0600; give the file the permissions an ordinary write would.
-  mode_t mask = umask(0);
-  umask(mask);
-  if (ok) ok = fchmod(fd, 0666 & ~mask) == 0;
   if (ok) ok = fsync(fd) == 0;
   if (::close(fd) != 0) ok = false;
-  if (ok) ok = std::rename(pattern.c_str(), path.c_str()) == 0;
-  if (!ok) ::unlink(pattern.c_str());
-  return ok;
+  if (ok) ok = std::rename(temporary.c_str(), path.c_str()) == 0;
+  if (!ok) ::unlink(temporary.c_str());
+  // The new name lives in the directory: without this it may be gone after a power cut.
+  return ok && syncDirectory(std::filesystem::path(path).parent_path().string());
 }
 
 std::string cachesDirectory() {

@@ -145,6 +145,17 @@ void restoreUids(PropertyList& value) {
 }  // namespace
 
 std::optional<Data> archiveDictionary(const StringDataDictionary& dictionary, std::string* error) {
+  for (const auto& [key, value] : dictionary) {
+    // Property lists keep text as C strings, and a key must come back as it went in.
+    if (key.find('\0') != std::string::npos) {
+      fail(error, "a key holds U+0000, which a property list cannot carry");
+      return std::nullopt;
+    }
+    if (toUTF8(fromUTF8(key)) != key) {
+      fail(error, "a key is not UTF-8");
+      return std::nullopt;
+    }
+  }
   // Object table: "$null", the dictionary, its keys, its values, its class description.
   Array objects;
   objects.emplace_back(String(u"$null"));

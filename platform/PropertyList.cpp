@@ -2,12 +2,14 @@
 
 #include <plist/plist.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstdlib>
 #include <limits>
 #include <memory>
 
 #include "Corvelbase/platform/Files.h"
+#include "platform/PlistShape.h"
 
 namespace corvel {
 
@@ -18,40 +20,66 @@ struct PlistFree {
 };
 using PlistPtr = std::unique_ptr<void, PlistFree>;
 
-// Seconds between the Unix epoch and the property lists' reference date; libplist's
-// dates count from the Unix epoch.
-constexpr double kReferenceDateOffset = 978307200.0;
-// Deeper trees than this are refused rather than risking the stack on hostile input.
-constexpr int kMaxDepth = 512;
+// libplist's dates are seconds from the reference date, handed over as whole seconds and
+// microseconds in 32 bits each; it reads them back with both parts rounded towards zero
+// and the microseconds without their sign.
+struct DateParts {
+  std::int32_t seconds;
+  std::int32_t micros;  // 0 to 999999
+};
 
-plist_t toNode(const PropertyList& value, int depth);
+double dateFromParts(DateParts parts) {
+  double fraction = parts.micros / 1e6;
+  return parts.seconds + (parts.seconds < 0 ? -fraction : fraction);
+}
 
-plist_t toNodeChecked(const PropertyList& value, int depth) {
-  if (depth > kMaxDepth) return nullptr;
-  return toNode(value, depth);
+bool dateInRange(double seconds) {
+  // Both ends are excluded: libplist's conversions give them for any value beyond.
+  return seconds > std::numeric_limits<std::int32_t>::min() &&
+         seconds < std::numeric_limits<std::int32_t>::max();
+}
+
+// A date node for the microsecond nearest to `seconds`; nullptr outside the 32-bit span.
+// (libplist adds the parts as a double that may fall just short of that microsecond,
+// and then reads it back one microsecond nearer to the reference date.)
+plist_t newDate(double seconds) {
+  if (!dateInRange(seconds)) return nullptr;
+  auto whole = static_cast<std::int32_t>(seconds);
+  auto micros = static_cast<std::int32_t>(std::lround((seconds - whole) * 1e6));
+  if (micros == 1'000'000 || micros == -1'000'000) {
+    if (!dateInRange(whole + micros / 1'000'000)) return nullptr;
+    whole += micros / 1'000'000;
+    micros = 0;
+  }
+  return plist_new_date(whole, micros);
+}
+
+// libplist keeps text as C strings: U+0000 cannot be written, and a key must be UTF-8.
+bool writableKey(const std::string& key) {
+  return key.find('\0') == std::string::npos && toUTF8(fromUTF8(key)) == key;
 }
 
 plist_t toNode(const PropertyList& value, int depth) {
+  if (depth > kMaxPropertyListDepth) return nullptr;
   const auto& v = value.value();
   if (auto b = std::get_if<bool>(&v)) return plist_new_bool(*b ? 1 : 0);
   if (auto i = std::get_if<std::int64_t>(&v)) return plist_new_uint(static_cast<uint64_t>(*i));
   if (auto u = std::get_if<std::uint64_t>(&v)) return plist_new_uint(*u);
   if (auto d = std::get_if<double>(&v)) return plist_new_real(*d);
-  if (auto s = std::get_if<String>(&v)) return plist_new_string(toUTF8(*s).c_str());
+  if (auto s = std::get_if<String>(&v)) {
+    if (s->find(u'\0') != String::npos) return nullptr;
+    return plist_new_string(toUTF8(*s).c_str());
+  }
   if (auto data = std::get_if<Data>(&v)) {
     return plist_new_data(reinterpret_cast<const char*>(data->data()), data->size());
   }
   if (auto uid = std::get_if<PropertyList::Uid>(&v)) return plist_new_uid(uid->value);
-  if (auto date = std::get_if<PropertyList::Date>(&v)) {
-    double unix = date->secondsSinceReferenceDate + kReferenceDateOffset;
-    double whole = std::floor(unix);
-    return plist_new_date(static_cast<int32_t>(whole),
-                          static_cast<int32_t>(std::lround((unix - whole) * 1e6)));
-  }
+  if (auto date = std::get_if<PropertyList::Date>(&v))
+    return newDate(date->secondsSinceReferenceDate);
   if (auto array = std::get_if<PropertyList::Array>(&v)) {
     PlistPtr node(plist_new_array());
     for (const auto& item : *array) {
-      plist_t child = toNodeChecked(item, depth + 1);
+      plist_t child = toNode(item, depth + 1);
       if (!child) return nullptr;
       plist_array_append_item(node.get(), child);
     }
@@ -60,7 +88,8 @@ plist_t toNode(const PropertyList& value, int depth) {
   if (auto dict = std::get_if<PropertyList::Dictionary>(&v)) {
     PlistPtr node(plist_new_dict());
     for (const auto& [key, item] : *dict) {
-      plist_t child = toNodeChecked(item, depth + 1);
+      if (!writableKey(key)) return nullptr;
+      plist_t child = toNode(item, depth + 1);
       if (!child) return nullptr;
       plist_dict_set_item(node.get(), key.c_str(), child);
     }
@@ -69,89 +98,112 @@ plist_t toNode(const PropertyList& value, int depth) {
   return nullptr;  // the absent value has no property-list form
 }
 
-std::optional<PropertyList> fromNode(plist_t node, int depth) {
-  if (!node || depth > kMaxDepth) return std::nullopt;
-  switch (plist_get_node_type(node)) {
-    case PLIST_BOOLEAN: {
-      uint8_t b = 0;
-      plist_get_bool_val(node, &b);
-      return PropertyList(b != 0);
+// Converts libplist's tree; the shape checks before parsing have made every key safe to
+// read. Counts objects as it goes (XML has no shared references, so this is the bound
+// for it).
+class NodeReader {
+ public:
+  explicit NodeReader(std::string* error) : error_(error) {}
+
+  std::optional<PropertyList> read(plist_t node, int depth) {
+    if (!node || depth > kMaxPropertyListDepth) return fail("the property list is malformed");
+    if (++objects_ > kMaxPropertyListObjects) {
+      return fail("the property list holds more than " + std::to_string(kMaxPropertyListObjects) +
+                  " objects");
     }
-    case PLIST_UINT: {
-      uint64_t u = 0;
-      plist_get_uint_val(node, &u);
-      return PropertyList(u);
-    }
-    case PLIST_REAL: {
-      double d = 0;
-      plist_get_real_val(node, &d);
-      return PropertyList(d);
-    }
-    case PLIST_STRING:
-    case PLIST_KEY: {
-      char* s = nullptr;
-      plist_get_string_val(node, &s);
-      PropertyList result(fromUTF8(s ? s : ""));
-      std::free(s);
-      return result;
-    }
-    case PLIST_DATA: {
-      char* bytes = nullptr;
-      uint64_t length = 0;
-      plist_get_data_val(node, &bytes, &length);
-      Data data(reinterpret_cast<uint8_t*>(bytes), reinterpret_cast<uint8_t*>(bytes) + length);
-      std::free(bytes);
-      return PropertyList(std::move(data));
-    }
-    case PLIST_DATE: {
-      int32_t sec = 0, usec = 0;
-      plist_get_date_val(node, &sec, &usec);
-      return PropertyList(PropertyList::Date{sec + usec / 1e6 - kReferenceDateOffset});
-    }
-    case PLIST_UID: {
-      uint64_t uid = 0;
-      plist_get_uid_val(node, &uid);
-      return PropertyList(PropertyList::Uid{uid});
-    }
-    case PLIST_ARRAY: {
-      PropertyList::Array array;
-      uint32_t count = plist_array_get_size(node);
-      array.reserve(count);
-      for (uint32_t i = 0; i < count; ++i) {
-        auto item = fromNode(plist_array_get_item(node, i), depth + 1);
-        if (!item) return std::nullopt;
-        array.push_back(std::move(*item));
+    switch (plist_get_node_type(node)) {
+      case PLIST_BOOLEAN: {
+        uint8_t b = 0;
+        plist_get_bool_val(node, &b);
+        return PropertyList(b != 0);
       }
-      return PropertyList(std::move(array));
-    }
-    case PLIST_DICT: {
-      PropertyList::Dictionary dict;
-      plist_dict_iter it = nullptr;
-      plist_dict_new_iter(node, &it);
-      std::optional<PropertyList> failed;
-      bool ok = true;
-      while (it) {
-        char* key = nullptr;
-        plist_t child = nullptr;
-        plist_dict_next_item(node, it, &key, &child);
-        if (!child) {
-          std::free(key);
-          break;
-        }
-        auto item = fromNode(child, depth + 1);
-        if (!item || !key) ok = false;
-        if (ok) dict.emplace(key, std::move(*item));
-        std::free(key);
-        if (!ok) break;
+      case PLIST_UINT: {
+        uint64_t u = 0;
+        plist_get_uint_val(node, &u);
+        return PropertyList(u);
       }
-      std::free(it);
-      if (!ok) return std::nullopt;
-      return PropertyList(std::move(dict));
+      case PLIST_REAL: {
+        double d = 0;
+        plist_get_real_val(node, &d);
+        return PropertyList(d);
+      }
+      case PLIST_STRING: {
+        uint64_t length = 0;
+        const char* s = plist_get_string_ptr(node, &length);
+        return PropertyList(fromUTF8(std::string_view(s ? s : "", s ? length : 0)));
+      }
+      case PLIST_DATA: {
+        uint64_t length = 0;
+        const char* bytes = plist_get_data_ptr(node, &length);
+        const auto* begin = reinterpret_cast<const std::uint8_t*>(bytes);
+        return PropertyList(bytes ? Data(begin, begin + length) : Data());
+      }
+      case PLIST_DATE: {
+        DateParts parts{0, 0};
+        plist_get_date_val(node, &parts.seconds, &parts.micros);
+        if (!dateInRange(parts.seconds)) return fail("a date lies outside the years 1933 to 2069");
+        return PropertyList(PropertyList::Date{dateFromParts(parts)});
+      }
+      case PLIST_UID: {
+        uint64_t uid = 0;
+        plist_get_uid_val(node, &uid);
+        return PropertyList(PropertyList::Uid{uid});
+      }
+      case PLIST_ARRAY:
+        return readArray(node, depth);
+      case PLIST_DICT:
+        return readDictionary(node, depth);
+      default:
+        return fail("the property list holds an object of an unknown type");
     }
-    default:
-      return std::nullopt;
   }
-}
+
+ private:
+  std::optional<PropertyList> readArray(plist_t node, int depth) {
+    PropertyList::Array array;
+    // The iterator, not plist_array_get_item: libplist finds the n-th item of a list it
+    // parsed by walking from the first, which makes reading an array quadratic.
+    plist_array_iter it = nullptr;
+    plist_array_new_iter(node, &it);
+    std::unique_ptr<void, decltype(&std::free)> iterator(it, &std::free);
+    for (uint32_t i = 0, count = plist_array_get_size(node); i < count; ++i) {
+      plist_t child = nullptr;
+      plist_array_next_item(node, it, &child);
+      auto item = read(child, depth + 1);
+      if (!item) return std::nullopt;
+      array.push_back(std::move(*item));
+    }
+    return PropertyList(std::move(array));
+  }
+
+  std::optional<PropertyList> readDictionary(plist_t node, int depth) {
+    PropertyList::Dictionary dict;
+    plist_dict_iter it = nullptr;
+    plist_dict_new_iter(node, &it);
+    std::unique_ptr<void, decltype(&std::free)> iterator(it, &std::free);
+    for (uint32_t i = 0, count = plist_dict_get_size(node); i < count; ++i) {
+      char* rawKey = nullptr;
+      plist_t child = nullptr;
+      plist_dict_next_item(node, it, &rawKey, &child);
+      std::unique_ptr<char, decltype(&std::free)> key(rawKey, &std::free);
+      if (!key || !child) return fail("the property list is malformed");
+      std::string name(key.get());
+      if (toUTF8(fromUTF8(name)) != name) return fail("a dictionary key is not UTF-8");
+      auto item = read(child, depth + 1);
+      if (!item) return std::nullopt;
+      dict.insert_or_assign(std::move(name), std::move(*item));
+    }
+    return PropertyList(std::move(dict));
+  }
+
+  std::optional<PropertyList> fail(const std::string& why) {
+    if (error_ && error_->empty()) *error_ = why;
+    return std::nullopt;
+  }
+
+  std::string* error_;
+  std::uint64_t objects_ = 0;
+};
 
 template <typename T>
 T saturatingCast(double d) {
@@ -234,12 +286,33 @@ std::optional<Data> PropertyList::serialize(Format format) const {
   return out;
 }
 
-std::optional<PropertyList> PropertyList::deserialize(const std::uint8_t* bytes, std::size_t size) {
-  if (!bytes || size == 0 || size > std::numeric_limits<uint32_t>::max()) return std::nullopt;
+std::optional<PropertyList> PropertyList::deserialize(const std::uint8_t* bytes, std::size_t size,
+                                                      std::string* error) {
+  std::string why;
+  if (!error) error = &why;
+  error->clear();
+  if (!bytes || size < 8) {
+    *error = "the data is too short to be a property list";
+    return std::nullopt;
+  }
+  if (size > kMaxPropertyListBytes) {
+    *error =
+        "the property list is larger than " + std::to_string(kMaxPropertyListBytes >> 20) + " MiB";
+    return std::nullopt;
+  }
+  const char* text = reinterpret_cast<const char*>(bytes);
+  bool binary = plist_is_binary(text, static_cast<uint32_t>(size));
+  PlistLimits limits{kMaxPropertyListObjects, kMaxPropertyListDepth};
+  *error = binary ? binaryPlistRefusal(bytes, size, limits) : xmlPlistRefusal(bytes, size, limits);
+  if (!error->empty()) return std::nullopt;
   plist_t raw = nullptr;
-  plist_from_memory(reinterpret_cast<const char*>(bytes), static_cast<uint32_t>(size), &raw);
+  plist_from_memory(text, static_cast<uint32_t>(size), &raw);
   PlistPtr node(raw);
-  return fromNode(node.get(), 0);
+  if (!node) {
+    *error = "the data is not a well-formed property list";
+    return std::nullopt;
+  }
+  return NodeReader(error).read(node.get(), 0);
 }
 
 bool PropertyList::writeToFile(const std::string& path, Format format) const {
@@ -247,10 +320,14 @@ bool PropertyList::writeToFile(const std::string& path, Format format) const {
   return bytes && writeFileAtomically(path, *bytes);
 }
 
-std::optional<PropertyList> PropertyList::readFromFile(const std::string& path) {
+std::optional<PropertyList> PropertyList::readFromFile(const std::string& path,
+                                                       std::string* error) {
   auto bytes = readFile(path);
-  if (!bytes) return std::nullopt;
-  return deserialize(*bytes);
+  if (!bytes) {
+    if (error) *error = "the file cannot be read";
+    return std::nullopt;
+  }
+  return deserialize(*bytes, error);
 }
 
 }  // namespace corvel

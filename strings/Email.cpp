@@ -50,6 +50,7 @@ std::optional<String> firstGroup(std::u16string_view pattern, uint32_t flags,
 }  // namespace
 
 std::optional<String> headerValueForField(const String& message, const String& field) {
+  if (field.size() > kMaxHeaderFieldLength) return std::nullopt;
   String pattern;
   pattern.reserve(kHeaderPatternStart.size() + field.size() + kHeaderPatternEnd.size());
   pattern.append(kHeaderPatternStart).append(field).append(kHeaderPatternEnd);

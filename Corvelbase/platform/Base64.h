@@ -1,6 +1,7 @@
 // Base64 as the desktop platform writes it, and the host operation `encodedBase64Data`.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -24,8 +25,12 @@ enum Base64EncodingOptions : std::uint32_t {
 // The base64 text of `bytes` (padded with '='), broken into lines as `options` say.
 CORVEL_EXPORT std::string base64Encoding(const Data& bytes, std::uint32_t options = 0);
 
+// Longer base64 text than this (about 96 MiB of data) is refused unread.
+inline constexpr std::size_t kMaxBase64TextLength = std::size_t{128} << 20;
+
 // The bytes of base64 text. Line ends and other whitespace are skipped; any other
-// character outside the alphabet, or a wrong length or padding, gives nullopt.
+// character outside the alphabet, a wrong length or padding, or text longer than
+// kMaxBase64TextLength gives nullopt.
 CORVEL_EXPORT std::optional<Data> base64Decoding(std::string_view text);
 
 // The host's operation on data objects: base64 in lines of 64 characters ended by CR LF,

@@ -74,7 +74,9 @@ class CORVEL_EXPORT FileWrapper {
   // Writes the wrapper to `path`: a regular file atomically, a directory by writing the
   // whole tree beside `path` first and then swapping it in, so a reader sees the old
   // tree or the new one. An existing file or directory at `path` is replaced only when
-  // the new one has been written in full. Returns false on any failure.
+  // the new one has been written in full; every file and directory is flushed to disk
+  // before this returns, with the usual permissions (0666 and 0777 less the umask).
+  // Returns false on any failure.
   bool writeToPath(const std::string& path) const;
 
   // A flat byte form of the wrapper and its children, for pasteboards: little-endian

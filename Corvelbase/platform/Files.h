@@ -12,14 +12,21 @@ namespace corvel {
 // The whole file, or nullopt when it cannot be read (missing, a directory, no access).
 CORVEL_EXPORT std::optional<Data> readFile(const std::string& path);
 
-// Writes `bytes` to a temporary file in the same directory, flushes it and renames it
-// over `path`, so a reader sees the old file or the new one, never a part. Returns false
-// (and leaves any old file untouched) on any failure.
+// Writes `bytes` to a temporary file in the same directory, flushes it, renames it over
+// `path` and flushes the directory, so a reader sees the old file or the new one, never
+// a part, and the new one survives a power cut once this returns. The file gets the
+// permissions an ordinary write would give (0666 less the umask); the umask is never
+// changed. Returns false (leaving any old file untouched, unless only the final flush of
+// the directory failed) on any failure.
 CORVEL_EXPORT bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes,
                                        std::size_t size);
 inline bool writeFileAtomically(const std::string& path, const Data& bytes) {
   return writeFileAtomically(path, bytes.data(), bytes.size());
 }
+
+// Flushes the entries of the directory at `path` ("" is the working directory) to disk,
+// as after a rename in it. False when it cannot be opened or flushed.
+CORVEL_EXPORT bool syncDirectory(const std::string& path);
 
 // The user's caches directory (see PlatformRegistry::setCachesDirectory), created with
 // its parents when missing. Empty when it cannot be determined or created.

@@ -1,5 +1,7 @@
-// Bitmaps and images: PNG decoded with libdeflate or libpng, JPEG, TIFF (first page),
-// BMP, GIF, WebP and PNM with Leptonica.
+// Bitmaps and images: PNG decoded with libdeflate or libpng, JPEG with libjpeg, TIFF
+// (first page), BMP, GIF, WebP and PNM with Leptonica. Decoding writes nothing to
+// standard error: what the libraries say about a damaged picture becomes its
+// failureReason().
 //
 // A `Bitmap` is decoded pixels: immutable once made and shared by reference, so it may
 // be read from any thread. An `Image` is a picture as the application hands it around: it

@@ -21,7 +21,8 @@ using StringDataDictionary = std::map<std::string, Data>;
 namespace KeyedArchive {
 
 // The archive of `dictionary` as a mutable dictionary (class NSMutableDictionary), its
-// keys and data stored inline. On failure nullopt, with the reason in `error` if given.
+// keys and data stored inline. On failure (a key that is not UTF-8 or holds U+0000, or
+// more than a property list may hold) nullopt, with the reason in `error` if given.
 CORVEL_EXPORT std::optional<Data> archiveDictionary(const StringDataDictionary& dictionary,
                                                     std::string* error = nullptr);
 

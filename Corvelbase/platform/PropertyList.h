@@ -4,8 +4,24 @@
 //
 // A PropertyList is a value: copying copies the whole tree. Dictionary keys are UTF-8;
 // string values are UTF-16 like every other String of the API.
+//
+// Reading hostile bytes: lists larger than kMaxPropertyListBytes, holding (once shared
+// references of a binary list are expanded, as libplist expands them) more than
+// kMaxPropertyListObjects objects, or nesting containers deeper than
+// kMaxPropertyListDepth are refused before they are parsed, with the reason; so are
+// dictionary keys that are not UTF-8 or hold U+0000 (text is kept as C strings by
+// libplist, which cannot carry such a key). String values keep every character,
+// U+0000 included.
+//
+// Dates: libplist hands dates over as whole seconds and microseconds (both rounded
+// towards zero) in 32 bits, so dates are kept between 1933-12-13 and 2069-01-19, to
+// within a microsecond (each pass through libplist may drop one, besides the double's
+// own rounding); a list holding a date outside that span is refused. A date
+// less than a second before the reference date reads as the same time after it (the
+// sign is lost in libplist's interface).
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <map>
 #include <optional>
@@ -17,6 +33,10 @@
 #include "Corvelbase/platform/String.h"
 
 namespace corvel {
+
+inline constexpr std::size_t kMaxPropertyListBytes = std::size_t{64} << 20;
+inline constexpr std::uint64_t kMaxPropertyListObjects = 1'000'000;
+inline constexpr int kMaxPropertyListDepth = 512;
 
 class CORVEL_EXPORT PropertyList {
  public:
@@ -82,18 +102,26 @@ class CORVEL_EXPORT PropertyList {
   std::int64_t integerValue() const;
   bool boolValue() const;
 
-  // Serialisation through libplist. Writing fails (nullopt) only for a tree holding the
-  // absent value. Reading accepts XML and binary lists (detected from the bytes) and
-  // gives nullopt for anything that is not a well-formed property list.
+  // Serialisation through libplist. Writing fails (nullopt) for a tree that could not be
+  // read back as it is: one holding the absent value, a key that is not UTF-8 or holds
+  // U+0000, a string holding U+0000 (libplist writes C strings), a date outside the
+  // span above, or containers nested deeper than kMaxPropertyListDepth. Reading accepts
+  // XML and binary lists (detected from the bytes) and gives nullopt for anything that
+  // is not a well-formed property list within the limits above, with the reason in
+  // `error` if given.
   std::optional<Data> serialize(Format format) const;
-  static std::optional<PropertyList> deserialize(const std::uint8_t* bytes, std::size_t size);
-  static std::optional<PropertyList> deserialize(const Data& bytes) {
-    return deserialize(bytes.data(), bytes.size());
+  static std::optional<PropertyList> deserialize(const std::uint8_t* bytes, std::size_t size,
+                                                 std::string* error = nullptr);
+  static std::optional<PropertyList> deserialize(const Data& bytes, std::string* error = nullptr) {
+    return deserialize(bytes.data(), bytes.size(), error);
   }
 
-  // Files: written atomically (a temporary file beside it, then renamed over it).
+  // Files: written atomically (a temporary file beside it, then renamed over it, see
+  // writeFileAtomically). Reading fails as deserialize does, or when the file cannot be
+  // read.
   bool writeToFile(const std::string& path, Format format) const;
-  static std::optional<PropertyList> readFromFile(const std::string& path);
+  static std::optional<PropertyList> readFromFile(const std::string& path,
+                                                  std::string* error = nullptr);
 
   friend bool operator==(const PropertyList&, const PropertyList&) = default;
 

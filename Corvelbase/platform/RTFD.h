@@ -36,9 +36,10 @@
 // destinations \fonttbl, \colortbl, \stylesheet, \info, \pict, \object, headers,
 // footers, footnotes, \fldinst, list tables, \listtext and every {\* ...} group.
 // Hostile input: any byte string gives an answer in time linear in its size; control
-// words and numbers of any length are skipped, nesting deeper than 4096 groups keeps the
-// innermost kept state, text after the group that closes the document is ignored, and a
-// truncated document yields what was read (an unfinished \NeXTGraphic is dropped).
+// words and numbers of any length are skipped, a document whose groups nest deeper than
+// kMaxRTFGroupDepth (the document's own group counts) is refused (nullopt) as soon as
+// the reader gets there, text after the group that closes the document is ignored, and
+// a truncated document yields what was read (an unfinished \NeXTGraphic is dropped).
 #pragma once
 
 #include <memory>
@@ -50,6 +51,8 @@
 #include "Corvelbase/platform/FileWrapper.h"
 
 namespace corvel {
+
+inline constexpr std::size_t kMaxRTFGroupDepth = 4096;
 
 // The name of the RTF text inside a bundle.
 CORVEL_EXPORT extern const std::string RTFDTextFileName;  // "TXT.rtf"
@@ -75,7 +78,8 @@ CORVEL_EXPORT std::optional<AttributedString> attributedStringWithRTFD(const Dat
 CORVEL_EXPORT std::optional<AttributedString> attributedStringWithContentsOfRTFD(
     const std::string& path);
 // The text of an RTF document alone: attachments come back without files. nullopt when
-// the bytes do not start as RTF.
+// the bytes do not start as RTF or nest too deep (see above); the readers above answer
+// the same for such a TXT.rtf.
 CORVEL_EXPORT std::optional<AttributedString> attributedStringWithRTF(const Data& rtf);
 
 }  // namespace corvel

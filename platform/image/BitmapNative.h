@@ -33,6 +33,17 @@ std::shared_ptr<Bitmap> bitmapFromPix(PIX* pix, std::string* failure);
 PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
                std::string* failure);
 
+// decodePNG without the libdeflate path: libpng for every PNG (the fuzzing harness holds
+// the two paths to the same pixels).
+PIX* decodePNGWithLibpng(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
+                         std::string* failure);
+
+// Decodes a JPEG file's bytes (grey, RGB or CMYK) the same way, reduced while decoding;
+// the full size goes to `fullWidth` and `fullHeight`. nullptr with *failure saying why
+// (libjpeg's own words included) when they are not a whole JPEG within the budget.
+PIX* decodeJPEG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
+                std::uint32_t* fullWidth, std::uint32_t* fullHeight, std::string* failure);
+
 // Asks the kernel for huge pages over the whole 2 MiB blocks of a fresh picture buffer
 // before it is first written.
 void adviseHugePages(void* buffer, std::size_t size);

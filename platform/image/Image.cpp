@@ -1,6 +1,10 @@
+#include <tiffio.h>
+
 #include <algorithm>
 #include <cctype>
 #include <cmath>
+#include <cstdarg>
+#include <cstdio>
 #include <cstdlib>
 #include <mutex>
 
@@ -10,12 +14,6 @@
 namespace corvel {
 
 namespace {
-
-// Leptonica reports problems on stderr by default; ours go into failure reasons instead.
-void quietLeptonica() {
-  static std::once_flag once;
-  std::call_once(once, [] { setMsgSeverity(L_SEVERITY_NONE); });
-}
 
 bool withinBudget(std::uint64_t width, std::uint64_t height) {
   return width > 0 && height > 0 && width * height <= kMaxImagePixels;
@@ -40,6 +38,68 @@ std::string formatName(l_int32 format) {
   }
 }
 
+// Leptonica and libtiff report problems on stderr by default ("Bad file: amount too big",
+// libtiff's "Not a TIFF file", libjpeg's words from inside a JPEG-compressed TIFF). While
+// this thread decodes, their messages are collected for the failure reason instead;
+// messages from any other use of the two libraries in the process go where they went
+// before.
+thread_local std::string* tCollected = nullptr;
+TIFFErrorHandler gPreviousTiffError = nullptr;
+TIFFErrorHandler gPreviousTiffWarning = nullptr;
+
+void collect(const char* module, const char* format, va_list args) {
+  if (!tCollected->empty()) return;  // the first message says the most
+  char text[512];
+  std::vsnprintf(text, sizeof text, format, args);
+  *tCollected = module && *module ? std::string(module) + ": " + text : text;
+}
+
+void tiffError(const char* module, const char* format, va_list args) {
+  if (tCollected) return collect(module, format, args);
+  if (gPreviousTiffError) gPreviousTiffError(module, format, args);
+}
+
+void tiffWarning(const char* module, const char* format, va_list args) {
+  if (!tCollected && gPreviousTiffWarning) gPreviousTiffWarning(module, format, args);
+}
+
+void leptonicaMessage(const char* text) {
+  if (!tCollected) {
+    std::fputs(text, stderr);
+  } else if (tCollected->empty()) {
+    std::string line = text;
+    while (!line.empty() && (line.back() == '\n' || line.back() == ' ')) line.pop_back();
+    *tCollected = line;
+  }
+}
+
+void quietLeptonica() {
+  static std::once_flag once;
+  std::call_once(once, [] {
+    setMsgSeverity(L_SEVERITY_NONE);
+    leptSetStderrHandler(leptonicaMessage);
+    gPreviousTiffError = TIFFSetErrorHandler(tiffError);
+    gPreviousTiffWarning = TIFFSetWarningHandler(tiffWarning);
+  });
+}
+
+// Collects the libraries' messages on this thread for as long as it lives.
+class Collecting {
+ public:
+  explicit Collecting(std::string* into) : previous_(tCollected) { tCollected = into; }
+  ~Collecting() { tCollected = previous_; }
+  Collecting(const Collecting&) = delete;
+  Collecting& operator=(const Collecting&) = delete;
+
+ private:
+  std::string* previous_;
+};
+
+std::string corruptOrTruncated(l_int32 format, const std::string& why) {
+  return "the " + formatName(format) + " image is corrupt or truncated" +
+         (why.empty() ? "" : " (" + why + ")");
+}
+
 // The bitmap of encoded bytes; with a `maxLongSide`, reduced to fit (a PNG while it is
 // decoded, anything else afterwards).
 // `bitmap` reduced to fit `maxLongSide`; itself when it fits or reducing fails.
@@ -58,10 +118,19 @@ std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure,
     *failure = "the data is not an image in a supported format";
     return nullptr;
   }
+  if (format == IFF_JFIF_JPEG) {
+    std::uint32_t width = 0, height = 0;
+    PIX* pix = decodeJPEG(bytes.data(), bytes.size(), maxLongSide, &width, &height, failure);
+    if (!pix) return nullptr;
+    if (fullSize) *fullSize = Size{static_cast<double>(width), static_cast<double>(height)};
+    return reducedBitmap(bitmapFromPix(pix, failure), maxLongSide);
+  }
+  std::string said;
+  Collecting collecting(&said);
   l_int32 width = 0, height = 0, bps = 0, spp = 0, colormapped = 0, headerFormat = 0;
   if (pixReadHeaderMem(bytes.data(), bytes.size(), &headerFormat, &width, &height, &bps, &spp,
                        &colormapped) != 0) {
-    *failure = "the " + formatName(format) + " image is corrupt or truncated";
+    *failure = corruptOrTruncated(format, said);
     return nullptr;
   }
   if (width <= 0 || height <= 0) {
@@ -76,8 +145,7 @@ std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure,
   PIX* pix = format == IFF_PNG ? decodePNG(bytes.data(), bytes.size(), maxLongSide, failure)
                                : pixReadMem(bytes.data(), bytes.size());
   if (!pix) {
-    if (format != IFF_PNG)
-      *failure = "the " + formatName(format) + " image is corrupt or truncated";
+    if (format != IFF_PNG) *failure = corruptOrTruncated(format, said);
     return nullptr;
   }
   if (fullSize) *fullSize = Size{static_cast<double>(width), static_cast<double>(height)};

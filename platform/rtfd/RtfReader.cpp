@@ -6,13 +6,13 @@
 #include <new>
 #include <string_view>
 
+#include "Corvelbase/platform/RTFD.h"
 #include "platform/rtfd/RtfCodec.h"
 
 namespace corvel::rtfd {
 
 namespace {
 
-constexpr std::size_t kMaxDepth = 4096;
 constexpr std::size_t kMaxWordLength = 32;  // longer words are nobody's and are skipped
 constexpr std::int64_t kMaxParameter = 1'000'000'000'000;
 constexpr int kDefaultCodePage = 1252;
@@ -102,7 +102,8 @@ class Parser {
   Parser(const std::uint8_t* bytes, std::size_t size, const AttachmentResolver& resolver)
       : p_(bytes), n_(size), resolver_(resolver) {}
 
-  AttributedString run(std::size_t start) {
+  // The text, or nullopt when groups nest deeper than kMaxRTFGroupDepth.
+  std::optional<AttributedString> run(std::size_t start) {
     pos_ = start;
     while (pos_ < n_ && !done_) {
       std::uint8_t c = p_[pos_++];
@@ -116,6 +117,7 @@ class Parser {
         textByte(c);
       }
     }
+    if (tooDeep_) return std::nullopt;
     flushBytes();  // a truncated document keeps what was read; an open graphic is dropped
     return build();
   }
@@ -126,8 +128,8 @@ class Parser {
   void openGroup() {
     flushBytes();
     pendingSkip_ = 0;
-    if (stack_.size() >= kMaxDepth) {
-      ++overflow_;
+    if (stack_.size() >= kMaxRTFGroupDepth) {
+      tooDeep_ = done_ = true;
       return;
     }
     Group child = stack_.empty() ? Group{} : top();
@@ -139,10 +141,6 @@ class Parser {
   void closeGroup() {
     flushBytes();
     pendingSkip_ = 0;
-    if (overflow_ > 0) {
-      --overflow_;
-      return;
-    }
     if (stack_.empty()) return;
     if (top().graphicRoot) finishGraphic();
     stack_.pop_back();
@@ -340,7 +338,7 @@ class Parser {
   std::size_t pos_ = 0;
   const AttachmentResolver& resolver_;
   std::vector<Group> stack_;
-  std::size_t overflow_ = 0;
+  bool tooDeep_ = false;
   bool done_ = false;
   int pendingSkip_ = 0;
   std::string bytes_;

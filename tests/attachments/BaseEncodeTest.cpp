@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include <chrono>
 #include <random>
 
 #include "Corvelbase/RVMXTextAttachment.h"
@@ -41,6 +42,11 @@ TEST(Base64, LinesOf64EndWithCarriageReturnLineFeed) {
   EXPECT_EQ(base64Encoding(Data(49, 0), lineFeedOnly).find('\r'), std::string::npos);
   for (const char* bad : {"A", "AB=C", "A===", "AB*D", "AA==AA=="})
     EXPECT_FALSE(base64Decoding(bad)) << bad;
+  // Text past the limit is refused without being read.
+  std::string huge(kMaxBase64TextLength + 1, 'A');
+  auto start = std::chrono::steady_clock::now();
+  EXPECT_FALSE(base64Decoding(huge));
+  EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(100));
 }
 
 TEST(BaseEncode, Base64ChoosesImageThenContentsThenFile) {

@@ -53,6 +53,9 @@ TEST(LinePrefix, TogglesThePrefixAndCarriesTheSelection) {
       {"empty document", u"", {0, 0}, u"- ", {0, 0}, {0, 0}},
       {"caret at very end", u"ab", {2, 0}, u"- ab", {0, 2}, {2, 0}},
       {"selection past the end", u"ab", {1, kMax}, u"- ab", {0, 2}, {3, 1}},
+      // The header's caveat: removing before a caret at the very end leaves the caret
+      // past the new end, for the host to clamp.
+      {"caret past the new end", u"- a", {3, 0}, u"a", {0, 3}, {3, 0}, md::insertUnorderedList},
       // The named commands, with their own prefixes.
       {"task off", u"- [ ] a", {6, 0}, u"a", {0, 7}, {0, 0}, md::insertTaskList},
       {"half prefix", u"- [x] a", {0, 0}, u"- [ ] - [x] a", {0, 7}, {6, 0}, md::insertTaskList},

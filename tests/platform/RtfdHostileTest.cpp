@@ -125,11 +125,12 @@ TEST(RtfdHostile, EveryTruncationOfAWrittenDocumentReadsAsItsBeginning) {
   EXPECT_EQ(attributedStringWithRTF(rtf)->string(), full);
 }
 
-TEST(RtfdHostile, HugeTokensAndDeepNestingStayQuick) {
+TEST(RtfdHostile, HugeTokensStayQuickAndDeepNestingIsRefused) {
   const std::pair<std::string, std::u16string> cases[] = {
       {"{\\rtf1 a\\" + std::string(100u << 20, 'x') + " b}", u"ab"},   // a 100 MB control word
       {"{\\rtf1 a\\fs" + std::string(16u << 20, '9') + " b}", u"ab"},  // a 16 MB parameter
-      {"{\\rtf1 a" + std::string(1u << 20, '{') + "b", u"ab"},         // a million groups
+      // Groups nested exactly as deep as allowed, the document's own included.
+      {"{\\rtf1 a" + std::string(kMaxRTFGroupDepth - 1, '{') + "b", u"ab"},
   };
   for (const auto& [rtf, text] : cases) {
     Data bytes = bytesOf(rtf);
@@ -139,6 +140,13 @@ TEST(RtfdHostile, HugeTokensAndDeepNestingStayQuick) {
     ASSERT_TRUE(read) << rtf.size();
     EXPECT_EQ(read->string(), text) << rtf.size();
     EXPECT_LT(took.count(), 5.0) << rtf.size();
+  }
+  // One group deeper, or a million, is refused as soon as the reader gets there.
+  for (std::size_t groups : {kMaxRTFGroupDepth, std::size_t{1} << 20}) {
+    auto started = std::chrono::steady_clock::now();
+    EXPECT_FALSE(attributedStringWithRTF(bytesOf("{\\rtf1 a" + std::string(groups, '{') + "b")))
+        << groups;
+    EXPECT_LT(std::chrono::steady_clock::now() - started, std::chrono::seconds(1));
   }
 }
 

@@ -64,6 +64,11 @@ TEST(HeaderValue, OddMessagesGetDefinedAnswers) {
   auto start = std::chrono::steady_clock::now();
   EXPECT_EQ(headerValueForField(runaway + u"\n", u"(?:a|aa)+(?:a|aa)+b"), std::nullopt);
   EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(30));
+  // A field as long as a header line can be is still a name; one unit longer is refused
+  // before a pattern is made of it.
+  String name(Email::kMaxHeaderFieldLength, u'X');
+  EXPECT_EQ(headerValueForField(name + u": v\n", name), u"v");
+  EXPECT_EQ(headerValueForField(name + u"X: v\n", name + u"X"), std::nullopt);
 }
 
 }  // namespace

@@ -49,9 +49,10 @@ std::optional<PropertyList::Array> readBlockArray(const std::string& path, std::
       return std::nullopt;
     }
   } else {
-    root = PropertyList::deserialize(*bytes);
+    std::string why;
+    root = PropertyList::deserialize(*bytes, &why);
     if (!root) {
-      error = "'" + path + "' is neither JSON nor a property list";
+      error = "'" + path + "' is neither JSON nor a property list (" + why + ")";
       return std::nullopt;
     }
   }
@@ -62,6 +63,11 @@ std::optional<PropertyList::Array> readBlockArray(const std::string& path, std::
   for (std::size_t i = 0; i < root->array()->size(); ++i) {
     if (!(*root->array())[i].dictionary()) {
       error = "'" + path + "': element " + std::to_string(i) + " is not a block dictionary";
+      return std::nullopt;
+    }
+    if (!RVRecognitionBlock::isWithinTreeDepth((*root->array())[i])) {
+      error = "'" + path + "': element " + std::to_string(i) + " nests deeper than " +
+              std::to_string(RVRecognitionBlock::kMaxTreeDepth) + " block levels";
       return std::nullopt;
     }
   }

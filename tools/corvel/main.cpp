@@ -1,8 +1,15 @@
 // corvel: the library's jobs on the command line.
+#include <unistd.h>
+
 #include <iostream>
 #include <map>
+#include <string>
+#include <thread>
 
 #include "Commands.h"
+#include "Corvelbase/RVVisionOCR.h"
+#include "Corvelbase/platform/OperationQueue.h"
+#include "Corvelbase/platform/Platform.h"
 
 namespace corvel::tool {
 
@@ -21,6 +28,27 @@ std::map<std::string, Command>& commands() {
 void printUsage(std::ostream& out) {
   out << "usage: corvel COMMAND [ARGS...]\n\ncommands:\n";
   for (const auto& [name, command] : commands()) out << "  " << command.usage << '\n';
+}
+
+// One line of the library's log, written at once; on a terminal the line is cleared
+// first, since a progress bar may stand on it (the bar is drawn again on its next step).
+void printLogLine(const std::string& line) {
+  std::string text = (isatty(STDERR_FILENO) ? "\r\033[K" : "") + line + "\n";
+  std::cerr << text << std::flush;
+}
+
+// The library logs from its worker threads (an OCR job's "Error: ..."), while this
+// program writes its own messages and progress bar from the main thread, piece by piece.
+// Log lines are therefore handed to the main thread, which writes them between its own
+// writes, never inside one; the commands that run jobs drain the main queue until the
+// jobs are done, and main() drains what is left once the jobs' workers are through.
+void installLogSink() {
+  static const std::thread::id mainThread = std::this_thread::get_id();
+  PlatformRegistry::setLogSink([](std::string_view line) {
+    std::string text(line);
+    if (std::this_thread::get_id() == mainThread) return printLogLine(text);
+    MainQueue::async([text] { printLogLine(text); });
+  });
 }
 
 }  // namespace
@@ -45,7 +73,13 @@ int main(int argc, char** argv) {
     printUsage(std::cerr);
     return misuse("unknown command '" + first + "'");
   }
-  return it->second.run(Arguments(argv + 2, argv + argc));
+  installLogSink();
+  int status = it->second.run(Arguments(argv + 2, argv + argc));
+  // An OCR job's worker logs its failure after handing its completion to the main queue:
+  // let the jobs' operations end, so that every log line is queued before the last drain.
+  if (first == "ocr") RVVisionOCR::ocrQueue()->waitUntilAllOperationsAreFinished();
+  MainQueue::drain();
+  return status;
 }
 
 }  // namespace corvel::tool
