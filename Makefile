@@ -43,8 +43,7 @@ fuzz: deps
 tsan: deps
 	$(call configure,$(TSAN_DIR),-DCMAKE_BUILD_TYPE=Debug -DCORVEL_TSAN=ON -DCORVEL_BUILD_BENCH=OFF)
 	cmake --build $(TSAN_DIR) -j $(JOBS) --target $(TSAN_TARGETS)
-	cd $(TSAN_DIR) && TSAN_OPTIONS="halt_on_error=1 second_deadlock_stack=1 \
-	  suppressions=$(CURDIR)/tests/tsan-suppressions.txt" \
+	cd $(TSAN_DIR) && TSAN_OPTIONS="halt_on_error=1 second_deadlock_stack=1" \
 	  ctest -j $(JOBS) --output-on-failure -R '$(TSAN_TESTS)' -E '$(TSAN_SKIP)'
 
 bench: build

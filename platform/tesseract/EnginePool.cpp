@@ -57,9 +57,16 @@ std::unique_ptr<Engine> EnginePool::acquire(const EngineKey& key, std::string* f
     values.insert(values.end(), {"0", "0"});
   }
   bool osd = key.languages == "osd";
-  int status = engine->api.Init(dataPath_.c_str(), key.languages.c_str(),
-                                osd ? tesseract::OEM_TESSERACT_ONLY : tesseract::OEM_LSTM_ONLY,
-                                nullptr, 0, &names, &values, false);
+  int status = 0;
+  {
+    // Starting an engine also writes Tesseract's process-wide parameters (where its
+    // messages go, among others): engines start one at a time.
+    static std::mutex starting;
+    std::lock_guard lock(starting);
+    status = engine->api.Init(dataPath_.c_str(), key.languages.c_str(),
+                              osd ? tesseract::OEM_TESSERACT_ONLY : tesseract::OEM_LSTM_ONLY,
+                              nullptr, 0, &names, &values, false);
+  }
   if (startSeconds) {
     *startSeconds =
         std::chrono::duration<double>(std::chrono::steady_clock::now() - started).count();
