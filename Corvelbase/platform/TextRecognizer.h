@@ -54,6 +54,14 @@ struct RecognizedText {
   float confidence = 0;
 };
 
+// One word of a line's best reading: its text, its box (normalised like the line's) and
+// the recogniser's confidence in it, 0 to 1.
+struct RecognizedWord {
+  String string;
+  Rect boundingBox;
+  float confidence = 0;
+};
+
 // A recognised text line: its box normalised to the image (0 to 1 on both axes, origin
 // at the bottom left, y growing upwards) and its readings, best first.
 struct CORVEL_EXPORT RecognizedTextObservation {
@@ -64,6 +72,9 @@ struct CORVEL_EXPORT RecognizedTextObservation {
   // share both; an engine that does not group lines gives every line its own paragraph.
   std::size_t block = 0;
   std::size_t paragraph = 0;
+  // The words of the best reading, left to right; empty when the recogniser does not
+  // tell words apart. Word boxes lie inside the line's box.
+  std::vector<RecognizedWord> words{};
 
   // The first `maxCandidateCount` readings (all of them when there are fewer).
   std::vector<RecognizedText> topCandidates(std::size_t maxCandidateCount) const;

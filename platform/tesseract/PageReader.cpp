@@ -259,6 +259,13 @@ bool PageReader::recognisePass(const Page& page, const std::string& models,
   return false;
 }
 
+Rect toWhole(const Rect& box, PageBox region, double width, double height) {
+  double top = region.y + (1 - box.origin.y - box.size.height) * region.h;
+  return Rect((region.x + box.origin.x * region.w) / width,
+              1 - (top + box.size.height * region.h) / height, box.size.width * region.w / width,
+              box.size.height * region.h / height);
+}
+
 // One reading of the part of `page` inside `region` (its pixels, clipped to the page)
 // as one block, with the lines' boxes normalised to the whole page. False with *error
 // as recognisePass.
@@ -275,12 +282,10 @@ bool PageReader::readRegion(const Page& page, PageBox region, const std::string&
   part.resolution = page.resolution;
   settings.singleBlock = true;
   if (!recognisePass(part, models, settings, watch, fast, out, error)) return false;
-  double w = width, h = height;
   for (auto& line : out->observations) {
-    Rect& box = line.boundingBox;
-    double top = region.y + (1 - box.origin.y - box.size.height) * region.h;
-    box = Rect((region.x + box.origin.x * region.w) / w, 1 - (top + box.size.height * region.h) / h,
-               box.size.width * region.w / w, box.size.height * region.h / h);
+    line.boundingBox = toWhole(line.boundingBox, region, width, height);
+    for (auto& word : line.words)
+      word.boundingBox = toWhole(word.boundingBox, region, width, height);
   }
   return true;
 }
@@ -494,6 +499,29 @@ bool PageReader::readMissedRegions(const Page& page, const std::string& models,
   return true;
 }
 
+// The words of the line `line` stands at the start of, for the word-level outputs
+// (hOCR, ALTO, TSV, a PDF's text layer). A copy of the iterator walks them, so the
+// caller's stepping by lines is unchanged.
+void PageReader::collectWords(const tesseract::LTRResultIterator& line, double width, double height,
+                              std::vector<RecognizedWord>* words) {
+  tesseract::LTRResultIterator it = line;
+  do {
+    if (it.Empty(tesseract::RIL_WORD)) continue;
+    std::unique_ptr<char[]> raw(it.GetUTF8Text(tesseract::RIL_WORD));
+    std::string text = trimmed(raw.get());
+    int left = 0, top = 0, right = 0, bottom = 0;
+    if (text.empty() || !it.BoundingBox(tesseract::RIL_WORD, &left, &top, &right, &bottom)) {
+      continue;
+    }
+    float confidence = std::clamp(it.Confidence(tesseract::RIL_WORD) / 100.0f, 0.0f, 1.0f);
+    words->push_back(
+        {fromUTF8(text),
+         Rect(left / width, 1.0 - bottom / height, (right - left) / width, (bottom - top) / height),
+         confidence});
+  } while (!it.IsAtFinalElement(tesseract::RIL_TEXTLINE, tesseract::RIL_WORD) &&
+           it.PageIterator::Next(tesseract::RIL_WORD));
+}
+
 void PageReader::collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult* out) {
   std::unique_ptr<tesseract::ResultIterator> results(api.GetIterator());
   if (!results) return;
@@ -522,6 +550,7 @@ void PageReader::collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult
     float confidence =
         std::clamp(it->LTRResultIterator::Confidence(tesseract::RIL_TEXTLINE) / 100.0f, 0.0f, 1.0f);
     observation.candidates.push_back({fromUTF8(text), confidence});
+    collectWords(*it, width, height, &observation.words);
     observation.block = blocks - 1;
     observation.paragraph = paragraphs - 1;
     auto characters = static_cast<double>(

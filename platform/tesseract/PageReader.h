@@ -126,6 +126,10 @@ struct Watch {
   }
 };
 
+// `box`, normalised to `region` of a page `width` x `height` pixels, normalised to the
+// whole page.
+Rect toWhole(const Rect& box, PageBox region, double width, double height);
+
 class PageReader {
  public:
   PageReader(std::string dataPath, std::uint64_t maxIdleModelBytes, unsigned maxConcurrent);
@@ -171,6 +175,8 @@ class PageReader {
   void record(double seconds, double cpuSeconds, double startSeconds, double startCpuSeconds,
               bool started);
   static void collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult* out);
+  static void collectWords(const tesseract::LTRResultIterator& line, double width, double height,
+                           std::vector<RecognizedWord>* words);
 
   EnginePool pool_;
   Gate gate_;

@@ -18,6 +18,7 @@ namespace corvel {
 using tesseract_backend::judge;
 using tesseract_backend::measurePage;
 using tesseract_backend::Page;
+using tesseract_backend::PageBox;
 using tesseract_backend::PagePlan;
 using tesseract_backend::PageReader;
 using tesseract_backend::PassResult;
@@ -28,6 +29,7 @@ using tesseract_backend::preparePage;
 using tesseract_backend::Reading;
 using tesseract_backend::Stop;
 using tesseract_backend::Threshold;
+using tesseract_backend::toWhole;
 using tesseract_backend::Watch;
 
 namespace {
@@ -214,10 +216,28 @@ class TesseractRecognizer::PageRecognition {
                                         error_)) {
       return std::nullopt;
     }
-    return std::move(result_.observations);
+    return uncropped();
   }
 
  private:
+  // Boxes are normalised to the page as read; a page cut from the desk has them brought
+  // back to the whole picture (the scale does not change normalised boxes). A turned
+  // page keeps them in its upright frame.
+  std::vector<RecognizedTextObservation> uncropped() {
+    PageBox crop = plan_.crop;
+    crop.w = std::min(crop.w, uncroppedWidth_ - crop.x);
+    crop.h = std::min(crop.h, uncroppedHeight_ - crop.y);
+    if (plan_.crop.w > 0 && crop.w > 0 && crop.h > 0 && !readTurned_) {
+      for (auto& line : result_.observations) {
+        line.boundingBox = toWhole(line.boundingBox, crop, uncroppedWidth_, uncroppedHeight_);
+        for (auto& word : line.words) {
+          word.boundingBox = toWhole(word.boundingBox, crop, uncroppedWidth_, uncroppedHeight_);
+        }
+      }
+    }
+    return std::move(result_.observations);
+  }
+
   bool chooseModels() {
     models_ = "eng";
     return request_.recognitionLanguages().empty() ||
@@ -228,6 +248,8 @@ class TesseractRecognizer::PageRecognition {
     page_ = preparePage(bitmap);
     bool prepared = page_.pix && (!fast_ || capLongSide(page_, impl_.options.fastMaxLongSide));
     if (prepared) {
+      uncroppedWidth_ = pixGetWidth(page_.pix);
+      uncroppedHeight_ = pixGetHeight(page_.pix);
       PlanLimits limits =
           fast_ ? PlanLimits{kFastEnlargeBelow, kFastEnlargeTo, 0, impl_.options.fastMaxLongSide}
                 : PlanLimits{kEnlargeBelow, kEnlargeTo, 0, kMaxScaledLongSide};
@@ -273,6 +295,7 @@ class TesseractRecognizer::PageRecognition {
         page_.replace(turned);
         page_.characters.clear();
         turnedFirst_ = true;
+        readTurned_ = true;
       }
     }
     if (detect_) {
@@ -337,7 +360,10 @@ class TesseractRecognizer::PageRecognition {
     bool kept = false;
     if (!turned.pix) return true;
     if (!tryAnother(turned, settings_, kTurnedWeight, kTurnedConfidenceGain, &kept)) return false;
-    if (kept) page_ = std::move(turned);
+    if (kept) {
+      page_ = std::move(turned);
+      readTurned_ = !readTurned_;
+    }
     return true;
   }
 
@@ -415,6 +441,8 @@ class TesseractRecognizer::PageRecognition {
   PassResult result_;
   PageReader::Orientation orientation_;
   bool orientationAsked_ = false, turnedFirst_ = false, mayTurn_ = false, scriptTrusted_ = false;
+  bool readTurned_ = false;  // the page read is the picture turned
+  int uncroppedWidth_ = 0, uncroppedHeight_ = 0;
 };
 
 std::optional<std::vector<RecognizedTextObservation>> TesseractRecognizer::recognize(
