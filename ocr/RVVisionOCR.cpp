@@ -8,7 +8,7 @@
 #include "Corvelbase/RVTextLayoutAnalyser.h"
 #include "Corvelbase/platform/Log.h"
 #include "Corvelbase/platform/Platform.h"
-#include "ocr/EngineOrder.h"
+#include "ocr/JobRecognition.h"
 
 namespace corvel {
 
@@ -22,7 +22,6 @@ const char* const RVVisionOCRUnsupportedReason =
 namespace {
 
 constexpr const char* kErrorLogFormat = "Error: %@";
-constexpr const char* kDefaultLanguage = "en-US";
 constexpr std::int64_t kMaxConcurrentJobs = 6;
 constexpr std::int64_t kHorizontalWritingDirection = 0;
 
@@ -163,15 +162,10 @@ void RVVisionOCR::runJob(const std::shared_ptr<JobState>& state, const LanguageC
       [self, state](TextRecognitionRequest& finished, const std::optional<Error>& error) {
         String text;
         if (!error && self->readingOrder_ != RVReadingOrderLayoutAnalysis) {
-          const auto& observations =
-              finished.results().value_or(std::vector<RecognizedTextObservation>());
-          auto columns = self->readingOrder_ == RVReadingOrderRows
-                             ? ocr_internal::rowsOrderColumns(observations)
-                             : ocr_internal::engineOrderColumns(observations);
-          text = ocr_internal::engineOrderText(columns);
-          self->layoutAnalyser_->setColumnBlocks(
-              std::make_shared<RVBlockArray>(std::move(columns)));
-          self->layoutAnalyser_->setOrderedText(text);
+          text = ocr_internal::orderedText(
+              self->readingOrder_,
+              finished.results().value_or(std::vector<RecognizedTextObservation>()), Size{},
+              *self->layoutAnalyser_);
         } else if (!error) {
           self->addRecognitionBlocksToAnalyser(finished);
           Size size = state->image ? state->image->size() : Size{};
@@ -183,26 +177,10 @@ void RVVisionOCR::runJob(const std::shared_ptr<JobState>& state, const LanguageC
           if (self->completion_) self->completion_(text, error);
         });
       });
-  PlatformVersion version = PlatformRegistry::platformVersion();
-  if (version.isAtLeast(13)) {
-    request->setRevision(3);
-  } else if (version.isAtLeast(11)) {
-    request->setRevision(2);
-  }
-  request->setUsesLanguageCorrection(true);
-  request->setTimeout(timeout_);
+  ocr_internal::configureRequest(
+      *request, languageCodes.empty() ? languageCodes : orderLanguageCodes(languageCodes),
+      useFastTextRecognition, timeout_);
   request->setCancellationCheck([state] { return state->stopped.load(std::memory_order_relaxed); });
-  request->setRecognitionLevel(useFastTextRecognition ? TextRecognitionLevelFast
-                                                      : TextRecognitionLevelAccurate);
-  if (languageCodes.empty()) {
-    if (version.isAtLeast(13)) {
-      request->setAutomaticallyDetectsLanguage(true);
-    } else {
-      request->setRecognitionLanguages({kDefaultLanguage});
-    }
-  } else {
-    request->setRecognitionLanguages(orderLanguageCodes(languageCodes));
-  }
   auto handler = ImageRequestHandler::initWithImage(state->image, {});
   Error error;
   if (!handler->performRequests({request}, &error)) {

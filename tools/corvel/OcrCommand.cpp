@@ -1,61 +1,66 @@
 // corvel ocr [--lang CODE]... [--fast] [--order rows|engine|layout] [--timeout SECONDS]
-//            [--json] [--overlay OUT.png] FILE-OR-URL...
+//            [--force-ocr] [-o OUT] [--format txt|json|hocr|alto|tsv|pdf]
+//            [--overlay OUT.png] FILE-OR-URL-OR-...
 //
-// Recognises each image and prints its text (a "==> FILE <==" header line before each
-// when there are several), in the order --order names: rows (the default) is the
-// engine's blocks and paragraphs with the rows of side-by-side short-line blocks kept
-// together, which measured best on real pages (forms, receipts, tables, court papers
-// and articles alike); engine is the engine's order alone; layout is the library's
-// layout analysis, the order the library's jobs give by default. --timeout bounds each
-// page's recognition (default: the recogniser's deadline, which grows with the page).
-// With --json it prints one JSON object per line and file:
-// {"file", "text", "blocks"} where "blocks" is the analysed column tree in the blocks'
-// dictionary form. --overlay draws the page with its columns (blue), paragraphs (green)
-// and lines (red) into OUT.png (OUT-1.png, OUT-2.png, ... for several files). All files
-// go through the shared queue at once; a progress bar goes to standard error when it is
-// a terminal. A file that fails gets its error on standard error and the others still
-// complete; the exit status is then 1. Results are printed in the order of the files,
-// each as soon as it and those before it are done. Ctrl-C prints what is finished,
-// stops the rest and exits with 130; a second Ctrl-C exits at once.
+// Recognises every page of each input (an image, a multi-page TIFF, a PDF, a `file:` URL,
+// or "-" for standard input) and writes the results in one format: to standard output,
+// or to OUT (written whole, atomically; "-o -" is standard output). The format is
+// --format's, else OUT's extension's, else text. A searchable PDF is one file per input
+// (OUT, or OUT-1.pdf, OUT-2.pdf, ... for several). Reading order: rows (the default) is
+// the engine's blocks and paragraphs with the rows of side-by-side short-line blocks
+// kept together, which measured best on real pages; engine is the engine's order alone;
+// layout is the library's layout analysis. --timeout bounds each page's recognition.
+// A PDF page that already has text is reported and kept as it is unless --force-ocr.
+// --overlay draws each page with its columns (blue), paragraphs (green, numbered in
+// reading order) and lines (red), and a legend, into OUT.png (OUT-1.png, ... for several
+// pages). All pages go through the shared queue at once; a progress bar counts pages on
+// standard error when it is a terminal. A file or page that fails gets one
+// "corvel: FILE: reason" line and the others still complete. Results come in the order
+// of the inputs, each as soon as it and those before it are done. Ctrl-C stops the
+// rest, writes what is finished and exits with 130; a second Ctrl-C exits at once.
+// Exit status: 0 when text was found; 1 when some input or page failed or nothing was
+// found (blank pages); 2 on misuse or when no input could be read.
 #include <signal.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cstdio>
 #include <cstdlib>
+#include <fstream>
 #include <iostream>
-#include <nlohmann/json.hpp>
+#include <sstream>
 #include <string>
 #include <vector>
 
 #include "Commands.h"
-#include "Corvelbase/RVRecognitionBlock.h"
-#include "Corvelbase/RVTextLayoutAnalyser.h"
+#include "Corvelbase/RVDocumentOCR.h"
+#include "Corvelbase/RVDocumentOutput.h"
 #include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/Files.h"
-#include "Corvelbase/platform/Image.h"
-#include "JsonConversion.h"
+#include "Corvelbase/platform/TextRecognizer.h"
+#include "Overlay.h"
 
 namespace corvel::tool {
 
 namespace {
 
-using nlohmann::json;
-
 struct Options {
   std::vector<std::string> languages;
   bool fast = false;
+  bool forceOCR = false;
   RVReadingOrder order = RVReadingOrderRows;
   double timeout = 0;
-  bool json = false;
+  std::optional<RVDocumentFormat> format;
+  std::string output;  // "" or "-": standard output
   std::string overlay;
   std::vector<std::string> inputs;
 };
 
-struct Outcome {
-  bool delivered = false;
-  String text;
-  std::optional<Error> error;
-  std::shared_ptr<RVVisionOCR> job;
+struct Input {
+  std::string name;  // as given
+  std::shared_ptr<RVDocumentOCR> job;
+  RVDocumentResult result;
+  bool done = false;
 };
 
 volatile sig_atomic_t interrupted = 0;
@@ -65,140 +70,84 @@ void onInterrupt(int) {
   interrupted = 1;
 }
 
-bool isURL(const std::string& input) {
-  return input.find("://") != std::string::npos || input.rfind("file:", 0) == 0;
-}
-
-std::shared_ptr<Image> imageFor(const std::string& input) {
-  return isURL(input) ? Image::initByReferencingURL(input) : Image::initByReferencingFile(input);
-}
-
-std::string describe(const Error& error) {
+std::string reasonOf(const Error& error) {
   std::string reason = error.userInfoString("Error reason");
-  return (reason.empty() ? error.description() : reason) + " (" + error.domain + " " +
-         std::to_string(error.code) + ")";
+  return reason.empty() ? error.description() : reason;
 }
 
-// --- the overlay ----------------------------------------------------------------------
+// --- languages --------------------------------------------------------------------------
 
-struct Colour {
-  std::uint8_t r, g, b;
-};
-
-void strokeRect(Data& rgba, std::uint32_t width, std::uint32_t height, const Rect& box,
-                Colour colour, int thickness) {
-  auto clampX = [&](double v) {
-    return static_cast<long>(std::clamp(v, 0.0, static_cast<double>(width) - 1));
+// The catalogue key a user's code names: a catalogue code ("fr-FR", any case), the
+// engine's model name ("fra") or the language alone ("fr") when one entry has it.
+std::optional<std::string> catalogueCode(const std::string& given, std::string* ambiguous) {
+  auto lower = [](std::string s) {
+    std::transform(s.begin(), s.end(), s.begin(),
+                   [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
+    return s;
   };
-  auto clampY = [&](double v) {
-    return static_cast<long>(std::clamp(v, 0.0, static_cast<double>(height) - 1));
-  };
-  if (!(box.size.width >= 0 && box.size.height >= 0)) return;  // also rejects NaN
-  // Boxes are normalised with the origin at the bottom left; pixels count from the top.
-  long left = clampX(box.origin.x * width), right = clampX((box.origin.x + box.size.width) * width);
-  long top = clampY((1 - box.origin.y - box.size.height) * height);
-  long bottom = clampY((1 - box.origin.y) * height);
-  auto plot = [&](long x, long y) {
-    if (x < 0 || y < 0 || x >= static_cast<long>(width) || y >= static_cast<long>(height)) return;
-    std::uint8_t* p =
-        &rgba[(static_cast<std::size_t>(y) * width + static_cast<std::size_t>(x)) * 4];
-    p[0] = colour.r, p[1] = colour.g, p[2] = colour.b, p[3] = 255;
-  };
-  for (int t = 0; t < thickness; ++t) {
-    for (long x = left - t; x <= right + t; ++x) plot(x, top - t), plot(x, bottom + t);
-    for (long y = top - t; y <= bottom + t; ++y) plot(left - t, y), plot(right + t, y);
-  }
-}
-
-void strokeTree(Data& rgba, std::uint32_t width, std::uint32_t height,
-                const RVRecognitionBlock& block, int thickness) {
-  static const Colour kColours[] = {{30, 90, 230}, {20, 160, 60}, {220, 40, 40}};
-  for (const auto& child : block.children()) strokeTree(rgba, width, height, *child, thickness);
-  auto level = std::min<std::uint64_t>(block.level(), 2);
-  // Outer levels are drawn a little outside the inner ones so all three stay visible.
-  int grow = static_cast<int>(2 - level) * thickness * 2;
-  Rect box = block.boundingBox();
-  double dx = static_cast<double>(grow) / width, dy = static_cast<double>(grow) / height;
-  Rect grown(box.origin.x - dx, box.origin.y - dy, box.size.width + 2 * dx,
-             box.size.height + 2 * dy);
-  strokeRect(rgba, width, height, grown, kColours[level], thickness);
-}
-
-// Draws the analysed tree over the page; an error message, or "" on success.
-std::string writeOverlay(const std::string& input, const RVBlockArray& columns,
-                         const std::string& out) {
-  auto page = imageFor(input)->bitmap();
-  if (!page) return "cannot read the image again for the overlay";
-  std::uint32_t width = page->width(), height = page->height();
-  Data rgba = page->rgba();
-  int thickness = static_cast<int>(std::max<std::uint32_t>(1, std::max(width, height) / 800));
-  for (const auto& column : columns) strokeTree(rgba, width, height, *column, thickness);
-  auto drawn = Bitmap::fromRGBA(width, height, rgba.data(), rgba.size());
-  auto png = drawn ? pngDataForBitmap(*drawn) : std::nullopt;
-  if (!png) return "cannot encode the overlay";
-  if (!writeFileAtomically(out, *png)) return "cannot write " + out;
-  return "";
-}
-
-std::string overlayName(const std::string& base, std::size_t index, std::size_t count) {
-  if (count == 1) return base;
-  std::size_t dot = base.rfind('.');
-  std::size_t slash = base.rfind('/');
-  if (dot == std::string::npos || (slash != std::string::npos && dot < slash)) dot = base.size();
-  return base.substr(0, dot) + "-" + std::to_string(index + 1) + base.substr(dot);
-}
-
-// --- progress and output --------------------------------------------------------------
-
-void showProgress(std::size_t done, std::size_t total) {
-  constexpr int kWidth = 30;
-  int filled = static_cast<int>(kWidth * done / std::max<std::size_t>(total, 1));
-  std::cerr << "\r[" << std::string(static_cast<std::size_t>(filled), '#')
-            << std::string(static_cast<std::size_t>(kWidth - filled), ' ') << "] " << done << "/"
-            << total << (done == total ? "\r\033[K" : "") << std::flush;
-}
-
-bool report(const Options& options, std::size_t index, const Outcome& outcome) {
-  const std::string& input = options.inputs[index];
-  if (outcome.error) {
-    std::cerr << "corvel: " << input << ": " << describe(*outcome.error) << '\n';
-    return false;
-  }
-  auto columns = outcome.job->layoutAnalyser()->layoutBlocks();
-  if (options.json) {
-    json blocks = json::array();
-    if (columns)
-      for (const auto& column : *columns)
-        blocks.push_back(jsonFromPropertyList(column->blockInformation()));
-    std::cout << json{{"file", input}, {"text", toUTF8(outcome.text)}, {"blocks", blocks}}.dump()
-              << '\n';
-  } else {
-    if (options.inputs.size() > 1) std::cout << (index ? "\n" : "") << "==> " << input << " <==\n";
-    std::cout << toUTF8(outcome.text) << '\n';
-  }
-  std::cout.flush();
-  if (!options.overlay.empty() && columns) {
-    std::string failure =
-        writeOverlay(input, *columns, overlayName(options.overlay, index, options.inputs.size()));
-    if (!failure.empty()) {
-      std::cerr << "corvel: " << input << ": " << failure << '\n';
-      return false;
+  std::string wanted = lower(given);
+  std::vector<std::string> byLanguage, byModel;
+  for (const auto& [key, entry] : RVVisionOCR::allVisionLanguages()) {
+    if (lower(key) == wanted) return key;
+    // Two entries share the Chinese models; the one that is its own code comes first.
+    if (TesseractRecognizer::modelForLanguageCode(key) == wanted) {
+      const PropertyList* iso = entry.find(RVVisionLanguageIsoCodeKey);
+      bool own = iso && iso->string() && toUTF8(*iso->string()) == key;
+      byModel.insert(own ? byModel.begin() : byModel.end(), key);
     }
+    if (lower(key.substr(0, key.find('-'))) == wanted) byLanguage.push_back(key);
   }
-  return true;
+  if (!byModel.empty()) return byModel.front();
+  if (byLanguage.size() == 1) return byLanguage[0];
+  if (byLanguage.size() > 1) {
+    for (const auto& key : byLanguage) *ambiguous += (ambiguous->empty() ? "" : ", ") + key;
+  }
+  return std::nullopt;
 }
 
-int run(const Arguments& args) {
-  Options options;
+std::string languageList() {
+  std::string list;
+  for (const auto& [key, entry] : RVVisionOCR::allVisionLanguages()) {
+    list += (list.empty() ? "" : ", ") + key + " (" +
+            TesseractRecognizer::modelForLanguageCode(key) + ")";
+  }
+  return list;
+}
+
+// --- arguments --------------------------------------------------------------------------
+
+const std::vector<std::string> kValueOptions = {"--lang",   "--order", "--timeout", "--format",
+                                                "--output", "-o",      "--overlay"};
+const std::vector<std::string> kFlags = {"--fast", "--json", "--force-ocr"};
+
+std::optional<int> parse(const Arguments& args, Options& options) {
+  bool json = false;
   for (std::size_t i = 0; i < args.size(); ++i) {
     const std::string& arg = args[i];
-    if (arg == "--lang" || arg == "--overlay" || arg == "--order" || arg == "--timeout") {
-      if (i + 1 >= args.size()) return misuse(arg + " needs a value");
+    bool takesValue =
+        std::find(kValueOptions.begin(), kValueOptions.end(), arg) != kValueOptions.end();
+    if (takesValue) {
+      if (i + 1 >= args.size()) return misuse("ocr: " + arg + " needs a value");
       const std::string& value = args[++i];
       if (arg == "--lang") {
-        options.languages.push_back(value);
+        std::string ambiguous;
+        auto code = catalogueCode(value, &ambiguous);
+        if (!code) {
+          return misuse("ocr: --lang " + value +
+                        (ambiguous.empty() ? " is not a recognition language"
+                                           : " could be " + ambiguous + "; say which") +
+                        "; the languages are " + languageList());
+        }
+        options.languages.push_back(*code);
       } else if (arg == "--overlay") {
         options.overlay = value;
+      } else if (arg == "--output" || arg == "-o") {
+        options.output = value;
+      } else if (arg == "--format") {
+        options.format = documentFormatNamed(value);
+        if (!options.format) {
+          return misuse("ocr: --format takes " + documentFormatNames() + ", not " + value);
+        }
       } else if (arg == "--order") {
         if (value == "rows") {
           options.order = RVReadingOrderRows;
@@ -207,92 +156,285 @@ int run(const Arguments& args) {
         } else if (value == "layout") {
           options.order = RVReadingOrderLayoutAnalysis;
         } else {
-          return misuse("--order takes rows, engine or layout, not " + value);
+          return misuse("ocr: --order takes rows, engine or layout, not " + value);
         }
       } else {
         char* end = nullptr;
         options.timeout = std::strtod(value.c_str(), &end);
         if (value.empty() || *end != '\0' || !(options.timeout > 0)) {
-          return misuse("--timeout takes a number of seconds above 0, not " + value);
+          return misuse("ocr: --timeout takes a number of seconds above 0, not " + value);
         }
       }
     } else if (arg == "--fast") {
       options.fast = true;
+    } else if (arg == "--force-ocr") {
+      options.forceOCR = true;
     } else if (arg == "--json") {
-      options.json = true;
+      json = true;
     } else if (arg.size() > 1 && arg[0] == '-') {
-      return misuse("unknown option " + arg);
+      std::vector<std::string> known = kValueOptions;
+      known.insert(known.end(), kFlags.begin(), kFlags.end());
+      return misuse("ocr: unknown option " + arg + didYouMean(arg, known));
     } else {
       options.inputs.push_back(arg);
     }
   }
-  if (options.inputs.empty()) return misuse("ocr needs at least one image file or file: URL");
-
-  std::vector<Outcome> outcomes(options.inputs.size());
-  for (std::size_t i = 0; i < options.inputs.size(); ++i) {
-    Outcome* outcome = &outcomes[i];
-    outcome->job = RVVisionOCR::init();
-    outcome->job->setReadingOrder(options.order);
-    outcome->job->setTimeout(options.timeout);
-    outcome->job->startOcrImage(imageFor(options.inputs[i]), options.languages, options.fast,
-                                [outcome](const String& text, const std::optional<Error>& error) {
-                                  outcome->delivered = true;
-                                  outcome->text = text;
-                                  outcome->error = error;
-                                });
+  if (options.inputs.empty())
+    return misuse("ocr: give at least one file, file: URL or - (standard input)");
+  if (std::count(options.inputs.begin(), options.inputs.end(), "-") > 1) {
+    return misuse("ocr: standard input (-) can be read once");
   }
-  // Results are printed in the order of the inputs, each as soon as it and all before it
-  // are in; the completions arrive on this thread, through the main queue.
-  bool progress = isatty(STDERR_FILENO) && options.inputs.size() > 1;
-  std::size_t printed = 0, delivered = 0;
-  bool allGood = true;
-  auto advance = [&] {
-    std::size_t now = static_cast<std::size_t>(std::count_if(
-        outcomes.begin(), outcomes.end(), [](const Outcome& o) { return o.delivered; }));
-    if (progress && now != delivered) showProgress(now, outcomes.size());
-    delivered = now;
-    while (printed < outcomes.size() && outcomes[printed].delivered) {
-      if (progress) std::cerr << "\r\033[K";
-      allGood = report(options, printed, outcomes[printed]) && allGood;
-      ++printed;
-      if (progress && printed < outcomes.size()) showProgress(delivered, outcomes.size());
+  if (json) {
+    if (options.format && *options.format != RVDocumentFormat::JSON) {
+      return misuse("ocr: --json and --format " + args.back() + " contradict each other");
     }
-    return printed == outcomes.size();
+    options.format = RVDocumentFormat::JSON;
+  }
+  if (!options.format && !options.output.empty() && options.output != "-") {
+    options.format = documentFormatForPath(options.output);
+    if (!options.format) {
+      return misuse("ocr: cannot tell the format from " + options.output + "; add --format " +
+                    documentFormatNames());
+    }
+  }
+  if (options.format == RVDocumentFormat::PDF) {
+    if (options.output.empty())
+      return misuse("ocr: a PDF goes to a file: add -o OUT.pdf (or -o -)");
+    if (options.output == "-" && options.inputs.size() > 1) {
+      return misuse("ocr: one PDF per input; -o - takes one input");
+    }
+  }
+  return std::nullopt;
+}
+
+// --- inputs -----------------------------------------------------------------------------
+
+// The path of a `file:` URL, or "" when it is no such URL.
+std::string pathOfFileURL(const std::string& url) {
+  std::string rest;
+  for (const char* prefix : {"file://localhost/", "file:///", "file:/"}) {
+    if (url.rfind(prefix, 0) == 0) {
+      rest = "/" + url.substr(std::string(prefix).size());
+      break;
+    }
+  }
+  std::string path;
+  for (std::size_t i = 0; i < rest.size(); ++i) {
+    if (rest[i] == '%' && i + 2 < rest.size() &&
+        std::isxdigit(static_cast<unsigned char>(rest[i + 1])) &&
+        std::isxdigit(static_cast<unsigned char>(rest[i + 2]))) {
+      path += static_cast<char>(std::stoi(rest.substr(i + 1, 2), nullptr, 16));
+      i += 2;
+    } else {
+      path += rest[i];
+    }
+  }
+  return path;
+}
+
+// Standard input kept in a temporary file: documents are read page by page, more than
+// once (for the PDF output), which a pipe does not allow.
+class SpooledInput {
+ public:
+  ~SpooledInput() {
+    if (!path_.empty()) std::remove(path_.c_str());
+  }
+  // The file's path, or "" (with *error) when standard input cannot be kept.
+  std::string spool(std::string* error) {
+    const char* dir = std::getenv("TMPDIR");
+    std::string pattern = std::string(dir && *dir ? dir : "/tmp") + "/corvel-stdin-XXXXXX";
+    int fd = mkstemp(pattern.data());
+    if (fd < 0) {
+      *error = "cannot make a temporary file for standard input";
+      return "";
+    }
+    path_ = pattern;
+    char buffer[1 << 16];
+    for (ssize_t n; (n = read(STDIN_FILENO, buffer, sizeof buffer)) != 0;) {
+      if (n < 0 && errno == EINTR) continue;
+      if (n < 0 || write(fd, buffer, static_cast<std::size_t>(n)) != n) {
+        close(fd);
+        *error = "cannot read standard input";
+        return "";
+      }
+    }
+    close(fd);
+    return path_;
+  }
+
+ private:
+  std::string path_;
+};
+
+std::string numberedName(const std::string& base, std::size_t index, std::size_t count) {
+  if (count == 1) return base;
+  std::size_t dot = base.rfind('.');
+  std::size_t slash = base.rfind('/');
+  if (dot == std::string::npos || (slash != std::string::npos && dot < slash)) dot = base.size();
+  return base.substr(0, dot) + "-" + std::to_string(index + 1) + base.substr(dot);
+}
+
+// --- progress ---------------------------------------------------------------------------
+
+void showProgress(std::size_t done, std::size_t total) {
+  constexpr int kWidth = 30;
+  int filled = static_cast<int>(kWidth * done / std::max<std::size_t>(total, 1));
+  std::cerr << "\r[" << std::string(static_cast<std::size_t>(filled), '#')
+            << std::string(static_cast<std::size_t>(kWidth - filled), ' ') << "] " << done << "/"
+            << total << " pages" << std::flush;
+}
+
+int run(const Arguments& args) {
+  Options options;
+  if (auto status = parse(args, options)) return *status;
+  RVDocumentFormat format = options.format.value_or(RVDocumentFormat::Text);
+
+  SpooledInput spooled;
+  std::vector<Input> inputs(options.inputs.size());
+  std::size_t opened = 0, totalPages = 0;
+  bool allGood = true;
+  for (std::size_t i = 0; i < inputs.size(); ++i) {
+    Input& input = inputs[i];
+    input.name = options.inputs[i];
+    input.result.name = input.name;
+    std::string path = input.name, failure;
+    if (path == "-") {
+      path = spooled.spool(&failure);
+    } else if (path.find("://") != std::string::npos || path.rfind("file:", 0) == 0) {
+      path = pathOfFileURL(path);
+      if (path.empty()) failure = "only file: URLs can be read";
+    }
+    Error error;
+    auto document = failure.empty() ? Document::initWithFile(path, &error) : nullptr;
+    if (!document) {
+      if (failure.empty()) failure = reasonOf(error);
+      std::cerr << "corvel: " << input.name << ": cannot be read: " << failure << '\n';
+      input.result.error =
+          failure.empty() ? error : makeDocumentError(DocumentErrorUnreadable, failure);
+      input.done = true;
+      allGood = false;
+      continue;
+    }
+    ++opened;
+    totalPages += document->pageCount();
+    input.job = RVDocumentOCR::init();
+    input.job->setReadingOrder(options.order);
+    input.job->setTimeout(options.timeout);
+    input.job->setForceOCR(options.forceOCR);
+    input.job->startOcrDocument(
+        document, options.languages, options.fast,
+        [&input](const RVDocumentPage& page) { input.result.pages.push_back(page); },
+        [&input](const std::optional<Error>& error) {
+          if (error && error->code != TextRecognitionErrorCancelled) input.result.error = error;
+          input.done = true;
+        });
+  }
+  if (opened == 0) return 2;
+
+  // Stream formats go to standard output as they come, or to OUT once all is done.
+  bool toStdout = options.output.empty() || options.output == "-";
+  std::ostringstream buffered;
+  std::ostream& out = toStdout ? std::cout : buffered;
+  auto writer = format == RVDocumentFormat::PDF
+                    ? nullptr
+                    : RVDocumentWriter::init(format, out, inputs.size());
+  bool progress = isatty(STDERR_FILENO) && totalPages > 1;
+  bool foundText = false;
+  std::size_t written = 0, overlays = 0, shownPages = SIZE_MAX;
+  auto finish = [&](Input& input) {
+    for (const auto& page : input.result.pages) {
+      if (page.error) {
+        allGood = false;
+        bool stopped = page.error->code == TextRecognitionErrorCancelled;
+        std::cerr << "corvel: " << input.name << ": page " << page.index + 1 << ": "
+                  << (stopped ? "interrupted before it was read" : reasonOf(*page.error)) << '\n';
+      } else if (page.hasOwnText) {
+        std::cerr << "corvel: " << input.name << ": page " << page.index + 1
+                  << " has text already; kept as it is (--force-ocr reads it)\n";
+      }
+      if (!page.error && !page.text.empty()) foundText = true;
+    }
+    if (input.result.error) {
+      allGood = false;
+      std::cerr << "corvel: " << input.name << ": " << reasonOf(*input.result.error) << '\n';
+    }
+    if (!input.job) return;  // reported when it could not be opened
+    if (writer) writer->add(input.result);
+    if (format == RVDocumentFormat::PDF) {
+      Error error;
+      std::string name = numberedName(options.output, written, inputs.size());
+      if (!writeSearchablePdf(*input.job->document(), input.result, name, &error)) {
+        allGood = false;
+        std::cerr << "corvel: " << input.name << ": " << reasonOf(error) << '\n';
+      }
+    }
+    if (!options.overlay.empty()) {
+      for (const auto& page : input.result.pages) {
+        if (!page.layoutBlocks) continue;
+        Error error;
+        auto picture = input.job->document()->renderPage(page.index, &error, nullptr);
+        std::string failure =
+            picture ? writeOverlay(*picture, *page.layoutBlocks,
+                                   numberedName(options.overlay, overlays++, totalPages))
+                    : reasonOf(error);
+        if (!failure.empty()) {
+          allGood = false;
+          std::cerr << "corvel: " << input.name << ": overlay: " << failure << '\n';
+        }
+      }
+    }
+    ++written;
   };
-  if (progress) showProgress(0, outcomes.size());
+  std::size_t next = 0;
+  auto advance = [&] {
+    if (progress) {
+      std::size_t pages = 0;
+      for (const auto& input : inputs) pages += input.job ? input.job->pagesDelivered() : 0;
+      if (pages != shownPages) showProgress(shownPages = pages, totalPages);
+    }
+    while (next < inputs.size() && inputs[next].done) {
+      if (progress) std::cerr << "\r\033[K";
+      finish(inputs[next++]);
+      shownPages = SIZE_MAX;
+    }
+    return next == inputs.size();
+  };
   struct sigaction action {};
   action.sa_handler = onInterrupt;
   sigemptyset(&action.sa_mask);
   struct sigaction previous {};
   sigaction(SIGINT, &action, &previous);
   MainQueue::runUntil([&] { return advance() || interrupted; });
+  if (interrupted) {
+    // What is finished stays; the rest is stopped, and its pages come back cancelled.
+    for (auto& input : inputs)
+      if (input.job) input.job->cancel();
+    MainQueue::runUntil([&] { return advance(); });
+  }
   sigaction(SIGINT, &previous, nullptr);
-  if (printed == outcomes.size()) return allGood ? 0 : 1;
-
-  // Interrupted: what is finished is printed, in order; the rest is stopped.
-  if (progress) std::cerr << "\r\033[K";
-  for (std::size_t i = printed; i < outcomes.size(); ++i) {
-    if (outcomes[i].delivered) {
-      report(options, i, outcomes[i]);
-    } else {
-      outcomes[i].job->stopOCRJob();
-      std::cerr << "corvel: " << options.inputs[i] << ": interrupted before it was read\n";
+  if (progress) std::cerr << "\r\033[K" << std::flush;
+  if (writer) writer->end();
+  if (writer && !toStdout) {
+    std::string bytes = buffered.str();
+    if (!writeFileAtomically(options.output, reinterpret_cast<const std::uint8_t*>(bytes.data()),
+                             bytes.size())) {
+      std::cerr << "corvel: cannot write " << options.output << '\n';
+      return interrupted ? 130 : 2;
     }
   }
   std::cout.flush();
-  std::cerr.flush();
-  // Recognitions still winding down on the queue's threads are not waited for.
-  std::_Exit(130);
+  if (interrupted) return 130;
+  return allGood && foundText ? 0 : 1;
 }
 
 CommandRegistration reg(
     "ocr",
-    "ocr [--lang CODE]... [--fast] [--order rows|engine|layout] "
-    "[--timeout SECONDS] [--json] [--overlay OUT.png] FILE-OR-URL... "
-    ": recognise the text of images; --order rows (the default, best measured on "
-    "real pages: keeps the rows of forms, receipts and tables together), engine "
-    "(the engine's blocks and paragraphs) or layout (the library's analysis)",
-    &run);
+    "ocr [--lang CODE]... [--fast] [--order rows|engine|layout] [--timeout SECONDS] "
+    "[--force-ocr] [-o OUT] [--format txt|json|hocr|alto|tsv|pdf] [--overlay OUT.png] "
+    "FILE-OR-URL-OR-... : recognise every page of images, multi-page TIFFs and PDFs (- reads "
+    "standard input); -o writes OUT (the format follows its extension), pdf makes a "
+    "searchable PDF; --lang takes fr-FR, fra or fr",
+    &run, "--fast --json --force-ocr");
 
 }  // namespace
 

@@ -1,8 +1,10 @@
 // corvel: the library's jobs on the command line.
 #include <unistd.h>
 
+#include <algorithm>
 #include <iostream>
 #include <map>
+#include <sstream>
 #include <string>
 #include <thread>
 
@@ -16,7 +18,9 @@ namespace corvel::tool {
 namespace {
 
 struct Command {
-  const char* usage;
+  std::string usage;  // "NAME ARGS..."
+  std::string summary;
+  std::vector<std::string> flags;
   CommandFunction run;
 };
 
@@ -25,9 +29,22 @@ std::map<std::string, Command>& commands() {
   return table;
 }
 
+std::vector<std::string> commandNames() {
+  std::vector<std::string> names;
+  for (const auto& [name, command] : commands()) names.push_back(name);
+  return names;
+}
+
 void printUsage(std::ostream& out) {
-  out << "usage: corvel COMMAND [ARGS...]\n\ncommands:\n";
+  out << "usage: corvel COMMAND [ARGS...]    (corvel help COMMAND, corvel --version)\n\n"
+         "commands:\n";
   for (const auto& [name, command] : commands()) out << "  " << command.usage << '\n';
+  out << "\noptions every command takes: --help, --verbose (the library's log lines on "
+         "standard error)\n";
+}
+
+void printCommandHelp(const Command& command, std::ostream& out) {
+  out << "usage: corvel " << command.usage << "\n\n" << command.summary << '\n';
 }
 
 // One line of the library's log, written at once; on a terminal the line is cleared
@@ -39,11 +56,15 @@ void printLogLine(const std::string& line) {
 
 // The library logs from its worker threads (an OCR job's "Error: ..."), while this
 // program writes its own messages and progress bar from the main thread, piece by piece.
-// Log lines are therefore handed to the main thread, which writes them between its own
-// writes, never inside one; the commands that run jobs drain the main queue until the
-// jobs are done, and main() drains what is left once the jobs' workers are through.
-void installLogSink() {
+// With --verbose, log lines are handed to the main thread, which writes them between its
+// own writes; without it they are dropped, since every failure also reaches the program
+// and is reported once, as one "corvel: FILE: reason" line.
+void installLogSink(bool verbose) {
   static const std::thread::id mainThread = std::this_thread::get_id();
+  if (!verbose) {
+    PlatformRegistry::setLogSink([](std::string_view) {});
+    return;
+  }
   PlatformRegistry::setLogSink([](std::string_view line) {
     std::string text(line);
     if (std::this_thread::get_id() == mainThread) return printLogLine(text);
@@ -51,15 +72,54 @@ void installLogSink() {
   });
 }
 
+std::size_t editDistance(const std::string& a, const std::string& b) {
+  std::vector<std::size_t> row(b.size() + 1);
+  for (std::size_t j = 0; j <= b.size(); ++j) row[j] = j;
+  for (std::size_t i = 1; i <= a.size(); ++i) {
+    std::size_t diagonal = row[0];
+    row[0] = i;
+    for (std::size_t j = 1; j <= b.size(); ++j) {
+      std::size_t above = row[j];
+      row[j] = std::min({row[j] + 1, row[j - 1] + 1, diagonal + (a[i - 1] == b[j - 1] ? 0 : 1)});
+      diagonal = above;
+    }
+  }
+  return row[b.size()];
+}
+
 }  // namespace
 
-CommandRegistration::CommandRegistration(const char* name, const char* usage, CommandFunction run) {
-  commands()[name] = Command{usage, run};
+CommandRegistration::CommandRegistration(const char* name, const char* usage, CommandFunction run,
+                                         const char* flags) {
+  std::string text = usage;
+  std::size_t colon = text.find(" : ");
+  Command command{
+      text.substr(0, colon), colon == std::string::npos ? "" : text.substr(colon + 3), {}, run};
+  std::istringstream names(flags);
+  for (std::string flag; names >> flag;) command.flags.push_back(flag);
+  commands()[name] = std::move(command);
 }
 
 int misuse(const std::string& message) {
   std::cerr << "corvel: " << message << '\n';
   return 2;
+}
+
+std::string closestMatch(const std::string& given, const std::vector<std::string>& candidates) {
+  std::string best;
+  std::size_t bestDistance = std::max<std::size_t>(1, std::min<std::size_t>(3, given.size() / 3));
+  for (const auto& candidate : candidates) {
+    std::size_t distance = editDistance(given, candidate);
+    if (distance <= bestDistance && (best.empty() || distance < editDistance(given, best))) {
+      best = candidate;
+    }
+  }
+  return best;
+}
+
+std::string didYouMean(const std::string& given, const std::vector<std::string>& candidates) {
+  std::string match = closestMatch(given, candidates);
+  return match.empty() ? "" : " (did you mean '" + match + "'?)";
 }
 
 int main(int argc, char** argv) {
@@ -68,13 +128,54 @@ int main(int argc, char** argv) {
     printUsage(argc < 2 ? std::cerr : std::cout);
     return argc < 2 ? 2 : 0;
   }
+  if (first == "--version") {
+    std::cout << "corvel " << CORVEL_VERSION << '\n';
+    return 0;
+  }
+  if (first == "help") {
+    if (argc < 3) {
+      printUsage(std::cout);
+      return 0;
+    }
+    auto it = commands().find(argv[2]);
+    if (it == commands().end()) {
+      return misuse("no command '" + std::string(argv[2]) + "'" +
+                    didYouMean(argv[2], commandNames()));
+    }
+    printCommandHelp(it->second, std::cout);
+    return 0;
+  }
   auto it = commands().find(first);
   if (it == commands().end()) {
-    printUsage(std::cerr);
-    return misuse("unknown command '" + first + "'");
+    return misuse("unknown command '" + first + "'" + didYouMean(first, commandNames()) +
+                  "; corvel --help lists them");
   }
-  installLogSink();
-  int status = it->second.run(Arguments(argv + 2, argv + argc));
+  const Command& command = it->second;
+  Arguments args;
+  bool verbose = false;
+  for (int i = 2; i < argc; ++i) {
+    std::string arg = argv[i];
+    if (arg.size() < 2 || arg[0] != '-') {
+      args.push_back(arg);
+    } else if (arg == "--help" || arg == "-h") {
+      printCommandHelp(command, std::cout);
+      return 0;
+    } else if (arg == "--verbose") {
+      verbose = true;
+    } else if (std::size_t equals = arg.find('=');
+               arg.starts_with("--") && equals != std::string::npos) {
+      std::string name = arg.substr(0, equals);
+      if (std::find(command.flags.begin(), command.flags.end(), name) != command.flags.end()) {
+        return misuse(first + ": " + name + " takes no value");
+      }
+      args.push_back(name);
+      args.push_back(arg.substr(equals + 1));
+    } else {
+      args.push_back(arg);
+    }
+  }
+  installLogSink(verbose);
+  int status = command.run(args);
   // An OCR job's worker logs its failure after handing its completion to the main queue:
   // let the jobs' operations end, so that every log line is queued before the last drain.
   if (first == "ocr") RVVisionOCR::ocrQueue()->waitUntilAllOperationsAreFinished();
