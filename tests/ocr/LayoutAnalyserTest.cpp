@@ -270,6 +270,14 @@ TEST(LayoutCommand, MalformedInputIsAMisuse) {
       {"element not a dictionary", "[{\"text\": \"x\"}, 3]", "element 1 is not a block"},
       {"neither JSON nor plist", "hello", "neither JSON nor a property list"},
       {"too deep", std::string(300, '[') + std::string(300, ']'), "nested too deeply"},
+      // A box that does not read is refused, not taken as the zero box.
+      {"no box", "[{}]", "element 0: boundingBox missing"},
+      {"box not text", "[{\"boundingBox\": 7}]", "boundingBox missing"},
+      {"box short of a number", "[{\"boundingBox\": \"{{0.1, 0.2}, {0.3}}\"}]", "is not {{x, y}"},
+      {"child box",
+       "[{\"boundingBox\": \"{{0, 0}, {1, 1}}\", \"childBlocks\": [{\"boundingBox\": \"{{a, 0}, "
+       "{1, 1}}\"}]}]",
+       "element 0 > element 0"},
   };
   for (const Case& c : cases) {
     auto result = layout(write(c.content) + " 2>&1");
@@ -278,9 +286,9 @@ TEST(LayoutCommand, MalformedInputIsAMisuse) {
   }
   for (std::string args : {dir.file("missing"), std::string(), "--bogus " + kArticle})
     EXPECT_EQ(layout(args + " 2>/dev/null").status, 2) << args;
-  // Blocks missing every key are still blocks: an empty page reads as empty text.
-  auto result = layout(write("[{}, {\"boundingBox\": 7}]"));
-  EXPECT_EQ(result.status, 0);
+  // An empty layout is "found nothing".
+  auto result = layout(write("[]"));
+  EXPECT_EQ(result.status, 1);
   EXPECT_EQ(result.output, "\n");
 }
 

@@ -389,12 +389,12 @@ TEST(OcrCommand, JsonGivesTheTextAndTheBlockTreeAndTheOverlayIsAPictureOfThePage
   ASSERT_EQ(result.status, 0) << result.output;
   auto object = nlohmann::json::parse(result.output, nullptr, false);
   ASSERT_FALSE(object.is_discarded()) << result.output;
-  EXPECT_EQ(object["file"], page("two-columns"));
-  EXPECT_LT(characterErrorRate(fixtureText("two-columns"), object["text"].get<std::string>()),
-            0.02);
-  // The tree is encoded as `corvel layout --json` does (checked in full there): columns.
-  ASSERT_GE(object["blocks"].size(), 2u) << object["blocks"];
-  EXPECT_EQ(object["blocks"][0]["level"], 0);
+  const auto& file = object["files"][0];
+  EXPECT_EQ(file["file"], page("two-columns"));
+  const auto& first = file["pages"][0];
+  EXPECT_LT(characterErrorRate(fixtureText("two-columns"), first["text"].get<std::string>()), 0.02);
+  // Blocks (the schema is checked in full with the other formats): the two columns.
+  EXPECT_GE(first["blocks"].size(), 2u) << first["blocks"];
   auto overlay = Image::initByReferencingFile(dir.file("over.png"));
   ASSERT_TRUE(overlay->bitmap()) << overlay->failureReason();
   EXPECT_EQ(overlay->size(), Image::initByReferencingFile(page("two-columns"))->size());

@@ -6,10 +6,14 @@
 // analyser in file order. Output: the reading-order text; with --json the analysed column
 // tree as a JSON array of block dictionaries; with --tree that tree as indented text.
 #include <cctype>
+#include <cmath>
 #include <cstdio>
+#include <cstdlib>
 #include <iostream>
+#include <iterator>
 #include <nlohmann/json.hpp>
 #include <optional>
+#include <regex>
 #include <string>
 
 #include "Commands.h"
@@ -28,7 +32,13 @@ enum class Output { Text, Json, Tree };
 
 // The file's array of block dictionaries, or nullopt with `error` set.
 std::optional<PropertyList::Array> readBlockArray(const std::string& path, std::string& error) {
-  std::optional<Data> bytes = readFile(path);
+  std::optional<Data> bytes;
+  if (path == "-") {
+    std::string all((std::istreambuf_iterator<char>(std::cin)), std::istreambuf_iterator<char>());
+    if (!std::cin.bad()) bytes = Data(all.begin(), all.end());
+  } else {
+    bytes = readFile(path);
+  }
   if (!bytes) {
     error = "cannot read '" + path + "'";
     return std::nullopt;
@@ -72,6 +82,42 @@ std::optional<PropertyList::Array> readBlockArray(const std::string& path, std::
     }
   }
   return std::move(*root->array());
+}
+
+// The first block (depth first) whose "boundingBox" is not the rectangle text form with
+// four finite numbers, described; "" when every box reads. The library's own reading
+// takes missing numbers as 0, which would put a mistyped box at the page's corner.
+std::string unreadableBox(const PropertyList::Array& blocks, const std::string& where) {
+  static const std::regex kRect(
+      R"(\s*\{\s*\{\s*([^,{}]+),\s*([^,{}]+)\}\s*,\s*\{\s*([^,{}]+),\s*([^,{}]+)\}\s*\}\s*)");
+  for (std::size_t i = 0; i < blocks.size(); ++i) {
+    const auto* info = blocks[i].dictionary();
+    if (!info) continue;
+    std::string here = where + "element " + std::to_string(i);
+    auto box = info->find("boundingBox");
+    const String* text = box == info->end() ? nullptr : box->second.string();
+    std::smatch match;
+    std::string utf8 = text ? toUTF8(*text) : "";
+    bool readable = text && std::regex_match(utf8, match, kRect);
+    for (std::size_t n = 1; readable && n <= 4; ++n) {
+      std::string number = match[n].str();
+      while (!number.empty() && std::isspace(static_cast<unsigned char>(number.back())))
+        number.pop_back();
+      char* end = nullptr;
+      double value = std::strtod(number.c_str(), &end);
+      readable = !number.empty() && *end == '\0' && std::isfinite(value);
+    }
+    if (!readable) {
+      return here + ": boundingBox " + (text ? "'" + utf8 + "'" : std::string("missing")) +
+             " is not {{x, y}, {w, h}}";
+    }
+    auto children = info->find("childBlocks");
+    if (children != info->end() && children->second.array()) {
+      std::string inner = unreadableBox(*children->second.array(), here + " > ");
+      if (!inner.empty()) return inner;
+    }
+  }
+  return "";
 }
 
 const char* levelName(RVRecognitionBlockLevel level) {
@@ -118,7 +164,7 @@ int run(const Arguments& args) {
       output = Output::Json;
     } else if (arg == "--tree") {
       output = Output::Tree;
-    } else if (!arg.empty() && arg[0] == '-') {
+    } else if (arg.size() > 1 && arg[0] == '-') {
       return misuse("layout: unknown option '" + arg + "'");
     } else if (path) {
       return misuse("layout: one file at a time");
@@ -130,12 +176,17 @@ int run(const Arguments& args) {
   std::string error;
   std::optional<PropertyList::Array> infos = readBlockArray(*path, error);
   if (!infos) return misuse("layout: " + error);
+  if (std::string bad = unreadableBox(*infos, ""); !bad.empty()) {
+    return misuse("layout: '" + *path + "': " + bad);
+  }
 
   auto analyser = RVTextLayoutAnalyser::init();
   for (const PropertyList& info : *infos)
     analyser->addRecognitionBlock(RVRecognitionBlock::createBlockFromInfo(info));
   analyser->analyse(Size{1, 1}, RVWritingDirectionHorizontal);
 
+  // An empty layout is "found nothing", as a blank page is for ocr.
+  int status = analyser->text().empty() ? 1 : 0;
   switch (output) {
     case Output::Text:
       std::cout << toUTF8(analyser->text()) << '\n';
@@ -151,14 +202,15 @@ int run(const Arguments& args) {
       printTree(*analyser->layoutBlocks(), 0, std::cout);
       break;
   }
-  return 0;
+  return status;
 }
 
-CommandRegistration reg("layout",
-                        "layout FILE [--json | --tree] : reading-order text of line blocks "
-                        "(JSON array or plist of block dictionaries); --json prints the column "
-                        "tree as block dictionaries, --tree as indented text",
-                        &run);
+CommandRegistration reg(
+    "layout",
+    "layout FILE [--json | --tree] : reading-order text of line blocks "
+    "(JSON array or plist of block dictionaries; - reads standard input); --json prints the column "
+    "tree as block dictionaries, --tree as indented text",
+    &run, "--json --tree");
 
 }  // namespace
 

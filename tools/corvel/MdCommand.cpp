@@ -1,6 +1,7 @@
 // corvel md: the Markdown editing commands for editors written in any language. Reads a
 // UTF-8 document, runs one command on a selection and prints the result as one JSON object
 // (ranges in UTF-16 units, as the library counts), or with --apply the edited document.
+#include <algorithm>
 #include <charconv>
 #include <climits>
 #include <functional>
@@ -215,8 +216,18 @@ std::optional<std::string> parse(const Arguments& args, Options& o) {
       o.columns.emplace();
       ok = parseNumber(v, *o.columns);
     } else if (a == "--alignment") {
-      o.alignment.emplace();
-      ok = parseNumber(v, *o.alignment);
+      // The names a user means; the numbers the library takes (1 center, 2 right, any
+      // other left) are accepted as they were.
+      static const std::map<std::string, std::int64_t> kAlignments = {
+          {"left", 0}, {"center", 1}, {"centre", 1}, {"right", 2}};
+      if (auto it = kAlignments.find(v); it != kAlignments.end()) {
+        o.alignment = it->second;
+      } else {
+        o.alignment.emplace();
+        if (!parseNumber(v, *o.alignment)) {
+          return "--alignment takes left, center, right (or 0, 1, 2), not '" + v + "'";
+        }
+      }
     } else if (a == "--url") {
       o.url = v;
     } else if (a == "--prefix") {
@@ -312,12 +323,26 @@ int runEdit(const Options& o, const String& document) {
   return 0;
 }
 
+std::vector<std::string> commandNames() {
+  std::vector<std::string> names;
+  for (const auto& [name, command] : editCommands()) names.push_back(name);
+  names.insert(names.end(), kQueryCommands.begin(), kQueryCommands.end());
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
 int run(const Arguments& args) {
+  if (args.size() == 1 && args[0] == "--list") {
+    for (const auto& name : commandNames()) std::cout << name << '\n';
+    return 0;
+  }
   Options o;
-  if (auto error = parse(args, o)) return misuse(*error);
-  if (!editCommands().count(o.command) && !kQueryCommands.count(o.command))
-    return misuse("unknown Markdown command '" + o.command + "'");
-  if (auto error = checkOptions(o)) return misuse(*error);
+  if (auto error = parse(args, o)) return misuse("md: " + *error);
+  if (!editCommands().count(o.command) && !kQueryCommands.count(o.command)) {
+    return misuse("md: unknown Markdown command '" + o.command + "'" +
+                  didYouMean(o.command, commandNames()) + "; corvel md --list names them");
+  }
+  if (auto error = checkOptions(o)) return misuse("md: " + *error);
 
   String document;
   if (o.command != "headerForLevel" && o.command != "justifyString") {
@@ -338,10 +363,11 @@ int run(const Arguments& args) {
 
 CommandRegistration reg("md",
                         "md COMMAND --selection LOC,LEN [--level N] [--url U] [--rows R --columns "
-                        "C] [--alignment A] [--prefix P [--first-line-only]] [--apply] [FILE] : "
-                        "runs a Markdown editing command on a UTF-8 document (FILE or standard "
-                        "input) and prints its result as JSON, or the edited document",
-                        &run);
+                        "C] [--alignment left|center|right] [--prefix P [--first-line-only]] "
+                        "[--apply] [FILE] | md --list : runs a Markdown editing command on a UTF-8 "
+                        "document (FILE or standard input, -) and prints its result as JSON, or "
+                        "the edited document; --list names the commands",
+                        &run, "--apply --first-line-only --list");
 
 }  // namespace
 

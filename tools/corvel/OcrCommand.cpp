@@ -354,12 +354,12 @@ int run(const Arguments& args) {
       }
       if (!page.error && !page.text.empty()) foundText = true;
     }
+    if (writer) writer->add(input.result);
+    if (!input.job) return;  // it could not be opened, and said so then
     if (input.result.error) {
       allGood = false;
       std::cerr << "corvel: " << input.name << ": " << reasonOf(*input.result.error) << '\n';
     }
-    if (!input.job) return;  // reported when it could not be opened
-    if (writer) writer->add(input.result);
     if (format == RVDocumentFormat::PDF) {
       Error error;
       std::string name = numberedName(options.output, written, inputs.size());
