@@ -7,6 +7,7 @@
 // any code point of the basic plane can be selected and searched. Each word gets its own
 // text matrix: its font size is the box's height and it is stretched (Tz) to the box's
 // width, so that selecting a word in a viewer highlights the word on the picture.
+#include <poppler/cpp/poppler-document.h>
 #include <qpdf/Buffer.hh>
 #include <qpdf/Pipeline.hh>
 #include <qpdf/QPDF.hh>
@@ -19,6 +20,7 @@
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
+#include <limits>
 #include <map>
 
 #include "Corvelbase/platform/Files.h"
@@ -335,13 +337,25 @@ void addPicturePage(QPDF& pdf, const Document& document, std::size_t index,
   QPDFPageDocumentHelper(pdf).addPage(QPDFPageObjectHelper(pdf.makeIndirectObject(page)), false);
 }
 
-bool emit(QPDF& pdf, const std::string& path, Error* error) {
+bool emit(QPDF& pdf, std::size_t pages, const std::string& path, Error* error) {
   QPDFWriter writer(pdf);
   writer.setOutputMemory();
   writer.write();
   auto buffer = writer.getBufferSharedPointer();
   const std::uint8_t* bytes = buffer->getBuffer();
   std::size_t size = buffer->getSize();
+  // A damaged input that qpdf repairs one way and Poppler another can come out as a file
+  // whose pages a reader no longer finds: the output is read back before it is kept.
+  std::unique_ptr<poppler::document> check(
+      size <= static_cast<std::size_t>(std::numeric_limits<int>::max())
+          ? poppler::document::load_from_raw_data(reinterpret_cast<const char*>(bytes),
+                                                  static_cast<int>(size))
+          : nullptr);
+  if (!check || check->pages() != static_cast<int>(pages)) {
+    *error = makeDocumentError(DocumentErrorDamaged,
+                               "the PDF is too damaged to add text to: its pages do not survive");
+    return false;
+  }
   if (path == "-") {
     if (std::fwrite(bytes, 1, size, stdout) != size || std::fflush(stdout) != 0) {
       *error = makeDocumentError(DocumentErrorWrite, "cannot write the PDF to standard output");
@@ -396,7 +410,7 @@ bool writeSearchablePdf(const Document& document, const std::vector<TextLayerPag
         addPicturePage(pdf, document, i, it == layers.end() ? nullptr : it->second, font);
       }
     }
-    return emit(pdf, path, error);
+    return emit(pdf, document.pageCount(), path, error);
   } catch (const std::exception& e) {
     *error = makeDocumentError(DocumentErrorWrite, std::string("cannot make the PDF: ") + e.what());
     return false;
