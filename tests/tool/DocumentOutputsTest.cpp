@@ -162,6 +162,7 @@ TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {
     std::string args;
     int status;
     std::string says;  // on standard output or error
+    std::string input = "";
   } cases[] = {
       {"--version", 0, "corvel 0.1"},
       {"help ocr", 0, "usage: corvel ocr"},
@@ -178,11 +179,16 @@ TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {
       {"ocr --format pdf x.png", 2, "-o OUT.pdf"},
       {"ocr - -", 2, "standard input"},
       {"md --list", 0, "insertTable"},
+      // Standard input for every command that reads a file.
+      {"lang -", 0, "fr", "Le chat dort sur la table de la cuisine pendant que nous mangeons."},
+      {"rtfd -", 2, "-: cannot be read", "not an RTFD"},
+      {"layout -", 1, "", "[]"},
       {"md insertTable --selection 0,0 --rows 1 --columns 1 --alignment middle", 2,
        "left, center, right"},
   };
   for (const auto& c : cases) {
-    auto result = testing::runCommand(tool() + " " + c.args + " 2>&1 </dev/null");
+    std::string input = c.input.empty() ? "</dev/null" : "<<'EOF'\n" + c.input + "\nEOF";
+    auto result = testing::runCommand(tool() + " " + c.args + " 2>&1 " + input);
     EXPECT_EQ(result.status, c.status) << c.args << "\n" << result.output;
     EXPECT_NE(result.output.find(c.says), std::string::npos) << c.args << "\n" << result.output;
   }

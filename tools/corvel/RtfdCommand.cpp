@@ -2,6 +2,7 @@
 #include <sys/stat.h>
 
 #include <iostream>
+#include <iterator>
 
 #include "Commands.h"
 #include "Corvelbase/platform/Files.h"
@@ -25,14 +26,18 @@ int run(const Arguments& args) {
   struct stat info {};
   std::optional<AttributedString> text;
   // A directory is a bundle; a file is the flat form of one.
-  if (::stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) {
+  if (path == "-") {
+    // Standard input holds the flat form.
+    std::string all((std::istreambuf_iterator<char>(std::cin)), std::istreambuf_iterator<char>());
+    if (!std::cin.bad()) text = attributedStringWithRTFD(Data(all.begin(), all.end()));
+  } else if (::stat(path.c_str(), &info) == 0 && S_ISDIR(info.st_mode)) {
     text = attributedStringWithContentsOfRTFD(path);
   } else if (auto bytes = readFile(path)) {
     text = attributedStringWithRTFD(*bytes);
   }
   if (!text) {
-    std::cerr << "corvel: rtfd: '" << path << "' is no readable RTFD bundle\n";
-    return 1;
+    std::cerr << "corvel: " << path << ": cannot be read as an RTFD bundle or its flat form\n";
+    return 2;
   }
   std::string out;
   String pending;  // converted in one piece so surrogate pairs stay whole
@@ -56,10 +61,11 @@ int run(const Arguments& args) {
   return 0;
 }
 
-CommandRegistration reg("rtfd",
-                        "rtfd BUNDLE-OR-FLAT-FILE : the text of an RTFD bundle (a directory, or "
-                        "its flat form in one file), each attachment as [file name]",
-                        &run);
+CommandRegistration reg(
+    "rtfd",
+    "rtfd BUNDLE-OR-FLAT-FILE : the text of an RTFD bundle (a directory, - for standard input, or "
+    "its flat form in one file), each attachment as [file name]",
+    &run);
 
 }  // namespace
 }  // namespace corvel::tool

@@ -11,14 +11,14 @@ std::optional<String> readTextInput(const std::string& commandName, const std::s
   if (path.empty() || path == "-") {
     std::string bytes((std::istreambuf_iterator<char>(std::cin)), std::istreambuf_iterator<char>());
     if (std::cin.bad()) {
-      std::cerr << "corvel: " << commandName << ": cannot read standard input\n";
+      std::cerr << "corvel: " << commandName << ": standard input cannot be read\n";
       return std::nullopt;
     }
     return fromUTF8(bytes);
   }
   std::optional<Data> bytes = readFile(path);
   if (!bytes) {
-    std::cerr << "corvel: " << commandName << ": cannot read '" << path << "'\n";
+    std::cerr << "corvel: " << path << ": cannot be read\n";
     return std::nullopt;
   }
   return fromUTF8(std::string_view(reinterpret_cast<const char*>(bytes->data()), bytes->size()));
