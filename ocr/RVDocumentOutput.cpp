@@ -117,6 +117,8 @@ class TextWriter final : public RVDocumentWriter {
  public:
   TextWriter(std::ostream& out, std::size_t inputs) : out_(out), headers_(inputs > 1) {}
   void add(const RVDocumentResult& result) override {
+    // An input that could not be read has no text, and no header either.
+    if (result.error && result.pages.empty()) return;
     if (headers_) out_ << (first_ ? "" : "\n") << "==> " << result.name << " <==\n";
     first_ = false;
     bool firstPage = true;

@@ -101,7 +101,8 @@ TEST(Rtfd, BundlesAndFlatFormsRoundTripTextAndFiles) {
   auto part = attributedStringWithRTFD(RTFDFromRange(sample, Range{6, 7}));
   EXPECT_EQ(part.value_or(AttributedString()).string(), u"{world}");
 
-  // The tool prints the text of both forms, attachments by name; a missing file fails.
+  // The tool prints the text of both forms, attachments by name; a missing file is
+  // unreadable input (2).
   ASSERT_TRUE(writeFileAtomically(dir.file("doc.flat"), flat));
   std::string expected =
       toUTF8(kTrickyText) + "[Attachment.png] | [notes.txt] | [notes.txt] | [Attachment.jpeg] | \n";
@@ -109,7 +110,7 @@ TEST(Rtfd, BundlesAndFlatFormsRoundTripTextAndFiles) {
     auto result = testing::runCommand(CORVEL_TOOL_PATH + std::string(" rtfd ") + dir.file(name) +
                                       " 2>/dev/null");
     bool missing = name == std::string("none");
-    EXPECT_EQ(result.status, missing ? 1 : 0) << name;
+    EXPECT_EQ(result.status, missing ? 2 : 0) << name;
     EXPECT_EQ(result.output, missing ? "" : expected) << name;
   }
 

@@ -53,3 +53,8 @@ CommandResult runCommand(const std::string& command) {
 }
 
 }  // namespace corvel::testing
+
+// Fontconfig's configuration, loaded once when Poppler first looks up a font that a PDF
+// does not embed (the text of a typed page), is kept for the life of the process; the
+// leak checker of the sanitizer builds is told so.
+extern "C" const char* __lsan_default_suppressions() { return "leak:libfontconfig.so\n"; }

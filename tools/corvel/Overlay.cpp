@@ -135,7 +135,7 @@ void strokeTree(Canvas& canvas, const RVRecognitionBlock& block, int thickness, 
 void drawLegend(Canvas& canvas, int thickness) {
   int scale = std::max(2, thickness * 2);
   const char* names[] = {"column", "paragraph", "line"};
-  long lineHeight = 10 * scale, width = 30 * 6 * scale;
+  long lineHeight = 10 * scale, width = 102 * scale;  // "= reading order" and its tag
   long x = 2 * scale, y = 2 * scale;
   canvas.fill(x, y, width, 4 * lineHeight + scale, kPaper);
   canvas.stroke(x, y, x + width, y + 4 * lineHeight + scale, kInk, 1);
