@@ -16,10 +16,14 @@
 #include <qpdf/QPDFPageObjectHelper.hh>
 #include <qpdf/QPDFWriter.hh>
 
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <limits>
 #include <map>
 
@@ -337,36 +341,86 @@ void addPicturePage(QPDF& pdf, const Document& document, std::size_t index,
   QPDFPageDocumentHelper(pdf).addPage(QPDFPageObjectHelper(pdf.makeIndirectObject(page)), false);
 }
 
+// A temporary file beside `path` (in the temporary folder for standard output), open
+// for writing; "" when none can be made.
+std::string temporaryBeside(const std::string& path, int* fd) {
+  std::string pattern;
+  if (path == "-") {
+    const char* dir = std::getenv("TMPDIR");
+    pattern = std::string(dir && *dir ? dir : "/tmp") + "/corvel-pdf-XXXXXX";
+  } else {
+    std::filesystem::path target(path);
+    std::filesystem::path dir = target.parent_path().empty() ? "." : target.parent_path();
+    std::string name = ".";
+    name.append(target.filename().string()).append(".XXXXXX");
+    pattern = (dir / name).string();
+  }
+  *fd = mkstemp(pattern.data());
+  return *fd < 0 ? "" : pattern;
+}
+
+// Writes the PDF to a temporary file, so that a long document never sits in memory
+// whole, reads it back, and only then renames it to `path` (or copies it to standard
+// output). A damaged input that qpdf repairs one way and Poppler another can come out as
+// a file whose pages a reader no longer finds: such a file is not kept.
 bool emit(QPDF& pdf, std::size_t pages, const std::string& path, Error* error) {
-  QPDFWriter writer(pdf);
-  writer.setOutputMemory();
-  writer.write();
-  auto buffer = writer.getBufferSharedPointer();
-  const std::uint8_t* bytes = buffer->getBuffer();
-  std::size_t size = buffer->getSize();
-  // A damaged input that qpdf repairs one way and Poppler another can come out as a file
-  // whose pages a reader no longer finds: the output is read back before it is kept.
-  std::unique_ptr<poppler::document> check(
-      size <= static_cast<std::size_t>(std::numeric_limits<int>::max())
-          ? poppler::document::load_from_raw_data(reinterpret_cast<const char*>(bytes),
-                                                  static_cast<int>(size))
-          : nullptr);
-  if (!check || check->pages() != static_cast<int>(pages)) {
-    *error = makeDocumentError(DocumentErrorDamaged,
-                               "the PDF is too damaged to add text to: its pages do not survive");
+  int fd = -1;
+  std::string temporary = temporaryBeside(path, &fd);
+  if (temporary.empty()) {
+    *error = makeDocumentError(DocumentErrorWrite, "cannot make a temporary file for " + path);
     return false;
   }
+  struct Cleanup {
+    std::string path;
+    ~Cleanup() {
+      if (!path.empty()) ::unlink(path.c_str());
+    }
+  } cleanup{temporary};
+  std::FILE* file = fdopen(fd, "wb");
+  if (!file) {
+    ::close(fd);
+    *error = makeDocumentError(DocumentErrorWrite, "cannot write " + temporary);
+    return false;
+  }
+  {
+    QPDFWriter writer(pdf);
+    writer.setOutputFile(temporary.c_str(), file, false);
+    writer.write();
+  }
+  bool written = std::fflush(file) == 0 && fsync(fileno(file)) == 0;
+  written = std::fclose(file) == 0 && written;
+  std::unique_ptr<poppler::document> check(poppler::document::load_from_file(temporary));
+  if (!written || !check || check->pages() != static_cast<int>(pages)) {
+    *error = makeDocumentError(
+        written ? DocumentErrorDamaged : DocumentErrorWrite,
+        written ? "the PDF is too damaged to add text to: its pages do not survive"
+                : "cannot write " + (path == "-" ? std::string("the PDF") : path));
+    return false;
+  }
+  check.reset();
   if (path == "-") {
-    if (std::fwrite(bytes, 1, size, stdout) != size || std::fflush(stdout) != 0) {
+    std::FILE* in = std::fopen(temporary.c_str(), "rb");
+    bool copied = in != nullptr;
+    char buffer[1 << 16];
+    for (std::size_t n; copied && (n = std::fread(buffer, 1, sizeof buffer, in)) > 0;) {
+      copied = std::fwrite(buffer, 1, n, stdout) == n;
+    }
+    if (in) std::fclose(in);
+    if (!copied || std::fflush(stdout) != 0) {
       *error = makeDocumentError(DocumentErrorWrite, "cannot write the PDF to standard output");
       return false;
     }
     return true;
   }
-  if (!writeFileAtomically(path, bytes, size)) {
+  // mkstemp makes the file private; it gets the permissions an ordinary write would.
+  mode_t mask = umask(0);
+  umask(mask);
+  ::chmod(temporary.c_str(), 0666 & ~mask);
+  if (std::rename(temporary.c_str(), path.c_str()) != 0) {
     *error = makeDocumentError(DocumentErrorWrite, "cannot write " + path);
     return false;
   }
+  cleanup.path.clear();
   return true;
 }
 
