@@ -340,7 +340,7 @@ int run(const Arguments& args) {
                     : RVDocumentWriter::init(format, out, inputs.size());
   bool progress = isatty(STDERR_FILENO) && totalPages > 1;
   bool foundText = false;
-  std::size_t written = 0, overlays = 0, shownPages = SIZE_MAX;
+  std::size_t overlays = 0, shownPages = SIZE_MAX;
   auto finish = [&](Input& input) {
     for (const auto& page : input.result.pages) {
       if (page.error) {
@@ -362,7 +362,9 @@ int run(const Arguments& args) {
     }
     if (format == RVDocumentFormat::PDF) {
       Error error;
-      std::string name = numberedName(options.output, written, inputs.size());
+      // Named by the input's place among all given, read or not.
+      auto index = static_cast<std::size_t>(&input - inputs.data());
+      std::string name = numberedName(options.output, index, inputs.size());
       if (!writeSearchablePdf(*input.job->document(), input.result, name, &error)) {
         allGood = false;
         std::cerr << "corvel: " << input.name << ": " << reasonOf(error) << '\n';
@@ -383,7 +385,6 @@ int run(const Arguments& args) {
         }
       }
     }
-    ++written;
   };
   std::size_t next = 0;
   auto advance = [&] {
