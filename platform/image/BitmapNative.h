@@ -4,6 +4,7 @@
 #include <leptonica/allheaders.h>
 
 #include <optional>
+#include <string>
 #include <vector>
 
 #include "Corvelbase/platform/Image.h"
@@ -43,6 +44,22 @@ PIX* decodePNGWithLibpng(const std::uint8_t* bytes, std::size_t size, std::uint3
 // (libjpeg's own words included) when they are not a whole JPEG within the budget.
 PIX* decodeJPEG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
                 std::uint32_t* fullWidth, std::uint32_t* fullHeight, std::string* failure);
+
+// Leptonica and libtiff report problems on stderr by default. Once quietLeptonica() has
+// run (any number of calls, from any thread), their messages on a thread where a
+// Collecting lives go into its string instead (the first message only, which says the
+// most); elsewhere they go where they went before.
+void quietLeptonica();
+class Collecting {
+ public:
+  explicit Collecting(std::string* into);
+  ~Collecting();
+  Collecting(const Collecting&) = delete;
+  Collecting& operator=(const Collecting&) = delete;
+
+ private:
+  std::string* previous_;
+};
 
 // Asks the kernel for huge pages over the whole 2 MiB blocks of a fresh picture buffer
 // before it is first written.

@@ -73,28 +73,6 @@ void leptonicaMessage(const char* text) {
   }
 }
 
-void quietLeptonica() {
-  static std::once_flag once;
-  std::call_once(once, [] {
-    setMsgSeverity(L_SEVERITY_NONE);
-    leptSetStderrHandler(leptonicaMessage);
-    gPreviousTiffError = TIFFSetErrorHandler(tiffError);
-    gPreviousTiffWarning = TIFFSetWarningHandler(tiffWarning);
-  });
-}
-
-// Collects the libraries' messages on this thread for as long as it lives.
-class Collecting {
- public:
-  explicit Collecting(std::string* into) : previous_(tCollected) { tCollected = into; }
-  ~Collecting() { tCollected = previous_; }
-  Collecting(const Collecting&) = delete;
-  Collecting& operator=(const Collecting&) = delete;
-
- private:
-  std::string* previous_;
-};
-
 std::string corruptOrTruncated(l_int32 format, const std::string& why) {
   return "the " + formatName(format) + " image is corrupt or truncated" +
          (why.empty() ? "" : " (" + why + ")");
@@ -198,6 +176,19 @@ std::optional<std::string> pathOfFileURL(const std::string& url, std::string* fa
 }
 
 }  // namespace
+
+void quietLeptonica() {
+  static std::once_flag once;
+  std::call_once(once, [] {
+    setMsgSeverity(L_SEVERITY_NONE);
+    leptSetStderrHandler(leptonicaMessage);
+    gPreviousTiffError = TIFFSetErrorHandler(tiffError);
+    gPreviousTiffWarning = TIFFSetWarningHandler(tiffWarning);
+  });
+}
+
+Collecting::Collecting(std::string* into) : previous_(tCollected) { tCollected = into; }
+Collecting::~Collecting() { tCollected = previous_; }
 
 std::shared_ptr<Bitmap> bitmapFromPix(PIX* pix, std::string* failure) {
   if (!pix) return nullptr;

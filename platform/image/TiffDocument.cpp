@@ -11,11 +11,6 @@ namespace corvel::document_backend {
 
 namespace {
 
-void quietLeptonica() {
-  static std::once_flag once;
-  std::call_once(once, [] { setMsgSeverity(L_SEVERITY_NONE); });
-}
-
 bool withinBudget(l_int32 width, l_int32 height) {
   return width > 0 && height > 0 &&
          static_cast<std::uint64_t>(width) * static_cast<std::uint64_t>(height) <= kMaxImagePixels;
@@ -36,10 +31,14 @@ class TiffDocument final : public Document {
       return nullptr;
     }
     auto n = static_cast<l_int32>(page);
+    quietLeptonica();
+    std::string said;  // what libtiff or Leptonica had to say about a damaged page
+    Collecting collecting(&said);
     l_int32 width = 0, height = 0, bps = 0, spp = 0, res = 0, cmap = 0, format = 0;
     if (readHeaderTiff(path().c_str(), n, &width, &height, &bps, &spp, &res, &cmap, &format) != 0) {
-      *error = makeDocumentError(DocumentErrorDamaged,
-                                 "page " + std::to_string(page + 1) + " of the TIFF is damaged");
+      *error = makeDocumentError(DocumentErrorDamaged, "page " + std::to_string(page + 1) +
+                                                           " of the TIFF is damaged" +
+                                                           (said.empty() ? "" : " (" + said + ")"));
       return nullptr;
     }
     if (!withinBudget(width, height)) {
@@ -51,6 +50,7 @@ class TiffDocument final : public Document {
     }
     std::string failure;
     auto bitmap = bitmapFromPix(pixReadTiff(path().c_str(), n), &failure);
+    if (failure.empty()) failure = said;
     if (!bitmap) {
       *error = makeDocumentError(DocumentErrorDamaged,
                                  "page " + std::to_string(page + 1) + " of the TIFF is damaged" +
@@ -73,6 +73,8 @@ double bitmapResolution(const Bitmap& bitmap) {
 
 bool probeImage(const std::string& path, Error* error) {
   quietLeptonica();
+  std::string said;
+  Collecting collecting(&said);
   l_int32 format = 0, width = 0, height = 0, bps = 0, spp = 0, cmap = 0;
   if (pixReadHeader(path.c_str(), &format, &width, &height, &bps, &spp, &cmap) != 0 ||
       format == IFF_UNKNOWN) {
@@ -91,12 +93,15 @@ bool probeImage(const std::string& path, Error* error) {
 
 std::shared_ptr<Document> openTiff(const std::string& path, Error* error) {
   quietLeptonica();
+  std::string said;
+  Collecting collecting(&said);
   std::FILE* file = std::fopen(path.c_str(), "rb");
   l_int32 pages = 0;
   bool counted = file && tiffGetCount(file, &pages) == 0 && pages > 0;
   if (file) std::fclose(file);
   if (!counted) {
-    *error = makeDocumentError(DocumentErrorDamaged, "the TIFF is damaged: no page can be read");
+    *error = makeDocumentError(DocumentErrorDamaged, "the TIFF is damaged: no page can be read" +
+                                                         (said.empty() ? "" : " (" + said + ")"));
     return nullptr;
   }
   return std::make_shared<TiffDocument>(path, static_cast<std::size_t>(pages));
