@@ -33,4 +33,9 @@ std::string closestMatch(const std::string& given, const std::vector<std::string
 // " (did you mean 'X'?)" for closestMatch, else "".
 std::string didYouMean(const std::string& given, const std::vector<std::string>& candidates);
 
+// How many of the library's log lines (shown with --verbose) have been written so far; a
+// command that draws a progress bar draws it again when this changes, since a log line
+// clears the bar's line.
+std::size_t logLinesWritten();
+
 }  // namespace corvel::tool

@@ -340,7 +340,7 @@ int run(const Arguments& args) {
                     : RVDocumentWriter::init(format, out, inputs.size());
   bool progress = isatty(STDERR_FILENO) && totalPages > 1;
   bool foundText = false;
-  std::size_t overlays = 0, shownPages = SIZE_MAX;
+  std::size_t overlays = 0, shownPages = SIZE_MAX, shownLogLines = 0;
   auto finish = [&](Input& input) {
     for (const auto& page : input.result.pages) {
       if (page.error) {
@@ -391,7 +391,10 @@ int run(const Arguments& args) {
     if (progress) {
       std::size_t pages = 0;
       for (const auto& input : inputs) pages += input.job ? input.job->pagesDelivered() : 0;
-      if (pages != shownPages) showProgress(shownPages = pages, totalPages);
+      if (pages != shownPages || logLinesWritten() != shownLogLines) {
+        showProgress(shownPages = pages, totalPages);
+        shownLogLines = logLinesWritten();
+      }
     }
     while (next < inputs.size() && inputs[next].done) {
       if (progress) std::cerr << "\r\033[K";
@@ -413,6 +416,10 @@ int run(const Arguments& args) {
     MainQueue::runUntil([&] { return advance(); });
   }
   sigaction(SIGINT, &previous, nullptr);
+  // A job's worker logs its failure after handing the completion to the main queue: let
+  // the workers end, so that every log line is written before the bar is cleared.
+  RVVisionOCR::ocrQueue()->waitUntilAllOperationsAreFinished();
+  MainQueue::drain();
   if (progress) std::cerr << "\r\033[K" << std::flush;
   if (writer) writer->end();
   if (writer && !toStdout) {

@@ -9,7 +9,6 @@
 #include <thread>
 
 #include "Commands.h"
-#include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
 
@@ -47,11 +46,14 @@ void printCommandHelp(const Command& command, std::ostream& out) {
   out << "usage: corvel " << command.usage << "\n\n" << command.summary << '\n';
 }
 
+std::size_t logLines = 0;  // written by the main thread only
+
 // One line of the library's log, written at once; on a terminal the line is cleared
-// first, since a progress bar may stand on it (the bar is drawn again on its next step).
+// first, since a progress bar may stand on it (the command draws the bar again).
 void printLogLine(const std::string& line) {
   std::string text = (isatty(STDERR_FILENO) ? "\r\033[K" : "") + line + "\n";
   std::cerr << text << std::flush;
+  ++logLines;
 }
 
 // The library logs from its worker threads (an OCR job's "Error: ..."), while this
@@ -102,6 +104,8 @@ CommandRegistration::CommandRegistration(const char* name, const char* usage, Co
   for (std::string flag; names >> flag;) command.flags.push_back(flag);
   commands()[name] = std::move(command);
 }
+
+std::size_t logLinesWritten() { return logLines; }
 
 int misuse(const std::string& message) {
   std::cerr << "corvel: " << message << '\n';
@@ -179,9 +183,6 @@ int main(int argc, char** argv) {
   }
   installLogSink(verbose);
   int status = command.run(args);
-  // An OCR job's worker logs its failure after handing its completion to the main queue:
-  // let the jobs' operations end, so that every log line is queued before the last drain.
-  if (first == "ocr") RVVisionOCR::ocrQueue()->waitUntilAllOperationsAreFinished();
   MainQueue::drain();
   return status;
 }
