@@ -1,4 +1,4 @@
-// Bitmaps and images: PNG decoded with libdeflate or libpng, JPEG with libjpeg, TIFF
+// Bitmaps and images: PNG decoded with libpng, JPEG with libjpeg, TIFF
 // (first page), BMP, GIF, WebP and PNM with Leptonica. Decoding writes nothing to
 // standard error: what the libraries say about a damaged picture becomes its
 // failureReason().
@@ -77,8 +77,9 @@ class CORVEL_EXPORT Image {
   // The pixels reduced so that the long side is at most `maxLongSide` (by area means, the
   // resolution reduced alike), for a reader that needs no more; the full bitmap when it
   // fits or `maxLongSide` is 0. An image that references a file and has not been decoded
-  // yet is reduced while it is decoded (a PNG a row at a time, without ever holding the
-  // full-size pixels), and nothing is kept. nullptr when the image cannot be decoded.
+  // yet is reduced while it is decoded (a JPEG, or a PNG that is not interlaced, a row at
+  // a time, without holding the full-size pixels), and nothing is kept. nullptr when the image
+  // cannot be decoded.
   std::shared_ptr<Bitmap> bitmapFittingLongSide(std::uint32_t maxLongSide) const;
   // Empty while decoding has not failed.
   std::string failureReason() const;

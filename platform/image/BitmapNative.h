@@ -34,11 +34,6 @@ std::shared_ptr<Bitmap> bitmapFromPix(PIX* pix, std::string* failure);
 PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
                std::string* failure);
 
-// decodePNG without the libdeflate path: libpng for every PNG (the fuzzing harness holds
-// the two paths to the same pixels).
-PIX* decodePNGWithLibpng(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
-                         std::string* failure);
-
 // Decodes a JPEG file's bytes (grey, RGB or CMYK) the same way, reduced while decoding;
 // the full size goes to `fullWidth` and `fullHeight`. nullptr with *failure saying why
 // (libjpeg's own words included) when they are not a whole JPEG within the budget.
@@ -71,11 +66,6 @@ void adviseHugePages(void* buffer, std::size_t size);
 // Leptonica's default deallocator (free) releases with the picture; this library never
 // installs a Leptonica pix memory manager and assumes its host does not either.
 PIX* createPagePix(std::uint32_t width, std::uint32_t height, int depth);
-
-// The same for the PNGs libdeflate can inflate whole (8-bit grey, RGB or RGBA, not
-// interlaced, no transparency key), always reduced to fit; nullptr for any other PNG and
-// for any fault, which decodePNG then reads and reports through libpng.
-PIX* decodePNGWhole(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide);
 
 // The size a picture is reduced to so that its long side is at most `maxLongSide`;
 // nullopt when it already fits (or nothing is asked).

@@ -134,12 +134,6 @@ bool readRows(png_structp png, png_infop info, Reader* reader) {
 
 PIX* decodePNG(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
                std::string* failure) {
-  if (PIX* pix = decodePNGWhole(bytes, size, maxLongSide)) return pix;
-  return decodePNGWithLibpng(bytes, size, maxLongSide, failure);
-}
-
-PIX* decodePNGWithLibpng(const std::uint8_t* bytes, std::size_t size, std::uint32_t maxLongSide,
-                         std::string* failure) {
   Reader reader{};
   reader.bytes = bytes;
   reader.size = size;
