@@ -155,7 +155,7 @@ TEST(PencilDrawingsHostile, PasteboardItemsThatAreNoDrawingsAreDroppedSilently) 
   testing::LogCapture log;
   Data truncated = *KeyedArchive::archiveDictionary({{"K", {1, 2}}});
   truncated.resize(truncated.size() - 5);
-  Data huge(100u << 20, 0xFF);  // 100 MB that claims to be a binary property list
+  Data huge(4u << 20, 0xFF);  // 4 MB that claims to be a binary property list
   std::copy_n("bplist00", 8, huge.begin());
   AttributedString text;
   for (const Data* item : {&truncated, &huge}) {

@@ -1,6 +1,5 @@
 // The layout analyser: driver, columns, paragraphs, bad geometry, and whole pages (the
-// bundled article, read in recogniser order and shuffled, through the library and through
-// `corvel layout`).
+// bundled article, read in recogniser order and shuffled).
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -205,8 +204,6 @@ std::pair<Tree, std::string> articleReading() {
   return out;
 }
 
-std::string articleText() { return articleReading().second; }
-
 TEST(LayoutPage, ArticleInAnyLineOrderGivesTheReadingOrderColumnsAndParagraphs) {
   std::mt19937 random(20240611);
   const auto [tree, pageText] = articleReading();
@@ -218,78 +215,6 @@ TEST(LayoutPage, ArticleInAnyLineOrderGivesTheReadingOrderColumnsAndParagraphs) 
     EXPECT_EQ(treeOf(*analysed(lines)), tree) << "round " << round;
   }
   EXPECT_EQ(toUTF8(analysed(articleLines())->text()), pageText);
-}
-
-// ---- corvel layout.
-
-testing::CommandResult layout(const std::string& args) {
-  return testing::runCommand(std::string(CORVEL_TOOL_PATH) + " layout " + args);
-}
-
-TEST(LayoutCommand, PrintsTheReadingOrderTextOfJSONAndPlistPages) {
-  PropertyList::Array infos;
-  for (const auto& block : articleLines()) infos.push_back(block->blockInformation());
-  testing::TempDir dir;
-  // Binary property lists go through the same reader as XML ones.
-  std::vector<std::string> pages = {kArticle, dir.file("page.plist")};
-  ASSERT_TRUE(PropertyList(infos).writeToFile(pages[1], PropertyList::Format::XML));
-  for (const std::string& page : pages) {
-    auto result = layout(page);
-    EXPECT_EQ(result.status, 0) << page;
-    EXPECT_EQ(result.output, articleText() + "\n") << page;
-  }
-}
-
-TEST(LayoutCommand, JsonIsTheColumnTreeInTheDictionaryForm) {
-  auto result = layout("--json " + kArticle);
-  ASSERT_EQ(result.status, 0);
-  json columns = json::parse(result.output);
-  ASSERT_EQ(columns.size(), 3u);
-  // The caption, folded into the left column, is its third paragraph, of one line.
-  const json& caption = columns[1]["childBlocks"][2];
-  EXPECT_EQ(std::tuple(columns[1]["level"], caption["level"], caption["childBlocks"][0]["level"]),
-            std::tuple(0, 1, 2));
-  EXPECT_EQ(caption["text"], "Fig. 1: Spraint sites along the lower Wend");
-  EXPECT_EQ(columns[0]["boundingBox"], "{{0.2, 0.9}, {0.6, 0.034}}");
-}
-
-TEST(LayoutCommand, MalformedInputIsAMisuse) {
-  testing::TempDir dir;
-  auto write = [&](const std::string& content) {
-    std::string path = dir.file("page.json");
-    EXPECT_TRUE(writeFileAtomically(path, Data(content.begin(), content.end())));
-    return path;
-  };
-  struct Case {
-    const char* name;
-    std::string content;
-    const char* message;
-  } cases[] = {
-      {"not JSON", "[{\"text\": ", "is not valid JSON"},
-      {"not an array", "{\"text\": \"x\"}", "must hold an array"},
-      {"element not a dictionary", "[{\"text\": \"x\"}, 3]", "element 1 is not a block"},
-      {"neither JSON nor plist", "hello", "neither JSON nor a property list"},
-      {"too deep", std::string(300, '[') + std::string(300, ']'), "nested too deeply"},
-      // A box that does not read is refused, not taken as the zero box.
-      {"no box", "[{}]", "element 0: boundingBox missing"},
-      {"box not text", "[{\"boundingBox\": 7}]", "boundingBox missing"},
-      {"box short of a number", "[{\"boundingBox\": \"{{0.1, 0.2}, {0.3}}\"}]", "is not {{x, y}"},
-      {"child box",
-       "[{\"boundingBox\": \"{{0, 0}, {1, 1}}\", \"childBlocks\": [{\"boundingBox\": \"{{a, 0}, "
-       "{1, 1}}\"}]}]",
-       "element 0 > element 0"},
-  };
-  for (const Case& c : cases) {
-    auto result = layout(write(c.content) + " 2>&1");
-    EXPECT_EQ(result.status, 2) << c.name;
-    EXPECT_NE(result.output.find(c.message), std::string::npos) << c.name << ": " << result.output;
-  }
-  for (std::string args : {dir.file("missing"), std::string(), "--bogus " + kArticle})
-    EXPECT_EQ(layout(args + " 2>/dev/null").status, 2) << args;
-  // An empty layout is "found nothing".
-  auto result = layout(write("[]"));
-  EXPECT_EQ(result.status, 1);
-  EXPECT_EQ(result.output, "\n");
 }
 
 }  // namespace

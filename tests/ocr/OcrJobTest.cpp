@@ -1,13 +1,10 @@
 // Recognition jobs with the scripted recogniser: request settings per platform version,
 // observations to blocks, delivery on the main queue, errors, cancelling, the queue's
-// limit; the language catalogue (entries, combinations, fast support, ordering, what the
-// recogniser supports); then the operation queues and the main queue beneath them
-// (running once, teardown, draining) where the jobs do not already drive them.
+// limit; the language catalogue (combinations, fast support, ordering, what the
+// recogniser supports).
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <atomic>
-#include <future>
 #include <thread>
 
 #include "Corvelbase/RVRecognitionBlock.h"
@@ -16,6 +13,7 @@
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Platform.h"
 #include "support/FakeRecognizer.h"
+#include "support/ForwardingRecognizer.h"
 #include "support/ManualDispatcher.h"
 #include "support/TestSupport.h"
 
@@ -254,9 +252,19 @@ TEST_F(OcrJob, TheCompletionRunsOnTheMainQueueAndTheJobAndImageAreLetGoThere) {
 
 TEST_F(OcrJob, ARecogniserErrorReachesTheCompletionUnchangedAndIsLogged) {
   testing::LogCapture log;
-  Error failure = makeTextRecognitionError(TextRecognitionErrorEngineFailure, "it broke");
-  fake_->setFailure(failure);
+  // The engine fails after reading the page, so its observations must not leak out.
+  struct Failing : testing::ForwardingRecognizer {
+    using ForwardingRecognizer::ForwardingRecognizer;
+    std::optional<std::vector<RecognizedTextObservation>> recognize(
+        const TextRecognitionRequest& request, const Bitmap& bitmap, Error* error) override {
+      ForwardingRecognizer::recognize(request, bitmap, error);
+      *error = makeTextRecognitionError(TextRecognitionErrorEngineFailure, "it broke");
+      return std::nullopt;
+    }
+  };
+  PlatformRegistry::setTextRecognizer(std::make_shared<Failing>(fake_));
   fake_->setObservations({line("never", 0.9f, Rect(0.1, 0.5, 0.3, 0.05))});
+  const Error failure = makeTextRecognitionError(TextRecognitionErrorEngineFailure, "it broke");
   Delivery delivery;
   auto job = startBlank(&delivery);
   finish(job);
@@ -353,7 +361,6 @@ TEST_F(OcrJob, SixRunAtOnceAndOnlyWaitingJobsAreCancelled) {
   };
   std::vector<Delivery> deliveries(8);
   auto jobs = startEight(deliveries);
-  EXPECT_FALSE(fake_->waitForRunning(7, 100ms));
   jobs[6]->cancelOCRJob();
   jobs[6]->cancelOCRJob();  // twice: no harm
   jobs[0]->cancelOCRJob();  // running: goes on
@@ -380,38 +387,6 @@ TEST_F(OcrJob, SixRunAtOnceAndOnlyWaitingJobsAreCancelled) {
 std::string stringAt(const PropertyList& entry, const char* key) {
   const PropertyList* value = entry.find(key);
   return value && value->string() ? toUTF8(*value->string()) : "<none>";
-}
-
-TEST(LanguageCatalogue, HasItsFourteenEntriesWithTheirQuirks) {
-  const auto& catalogue = RVVisionOCR::allVisionLanguages();
-  Codes keys;
-  for (const auto& [key, entry] : catalogue) keys.push_back(key);
-  std::sort(keys.begin(), keys.end());
-  EXPECT_EQ(keys, (Codes{"de-DE", "en-US", "es-ES", "fr-FR", "it-IT", "ja-JP", "ko-KR", "pt-BR",
-                         "ru-RU", "uk-UA", "yue-Hans", "yue-Hant", "zh-Hans", "zh-Hant"}));
-  struct Row {
-    const char* key;
-    const char* isoCode;
-    const char* name;
-    bool eastAsian;
-  } rows[] = {{"zh-Hans", "zh-Hans", "Chinese Simplified", true},
-              // Cantonese entries carry the Chinese codes.
-              {"yue-Hans", "zh-Hans", "Cantonese Simplified", true},
-              {"yue-Hant", "zh-Hant", "Cantonese Traditional", true},
-              {"ko-KR", "ko-KR", "Korean", true},
-              {"en-US", "en-US", "English", false},
-              {"uk-UA", "uk-UA", "Ukranian", false}};  // spelled as hosts know it
-  for (const auto& row : rows) {
-    // East-Asian entries read English as well and must lead the list.
-    PropertyList::Dictionary entry{{"isoCode", fromUTF8(row.isoCode)},
-                                   {"name", fromUTF8(row.name)}};
-    if (row.eastAsian) {
-      entry["secondary"] = PropertyList::Array{u"en-US"};
-      entry["forcePrimary"] = true;
-    }
-    EXPECT_EQ(catalogue.at(row.key), PropertyList(entry))
-        << row.key << ": " << stringAt(catalogue.at(row.key), "name");
-  }
 }
 
 TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
@@ -471,69 +446,6 @@ TEST_F(OcrJob, SupportedLanguagesFollowTheRecognisersOrderFromTenFifteenOn) {
   EXPECT_FALSE(RVVisionOCR::supportedLanguages(0));
   EXPECT_EQ(log.lines(),
             (std::vector<std::string>{"Error getting Vision Languages: " + error.description()}));
-}
-
-// ---- The queues beneath the jobs.
-
-TEST(OperationQueue, AddingTheSameOperationTwiceRunsItOnce) {
-  auto queue = OperationQueue::init();
-  std::atomic<int> ran{0};
-  auto operation = BlockOperation::blockOperationWithBlock([&] { ++ran; });
-  queue->addOperation(operation);
-  queue->addOperation(operation);
-  queue->addOperation(nullptr);
-  queue->waitUntilAllOperationsAreFinished();
-  queue->addOperation(operation);  // finished: ignored
-  queue->waitUntilAllOperationsAreFinished();
-  EXPECT_EQ(ran, 1);
-}
-
-// Regression: a queue that goes away with work still waiting must not run it nor hang.
-TEST(OperationQueue, DestroyingAQueueDropsWaitingWorkAndReleasesIt) {
-  auto held = std::make_shared<int>(7);
-  std::weak_ptr<int> watch = held;
-  std::atomic<bool> ran{false};
-  std::promise<void> started, open;
-  {
-    auto queue = OperationQueue::init();
-    queue->setMaxConcurrentOperationCount(1);
-    queue->addOperationWithBlock([&] {
-      started.set_value();
-      open.get_future().wait();
-    });
-    queue->addOperationWithBlock([&ran, held] { ran = true; });
-    held.reset();
-    ASSERT_EQ(started.get_future().wait_for(10s), std::future_status::ready);
-    // The running work may finish only once the waiting work has been dropped (its block,
-    // holding the last reference, is gone): otherwise the worker could start it first.
-    std::thread opener([&] {
-      auto deadline = std::chrono::steady_clock::now() + 10s;
-      while (!watch.expired() && std::chrono::steady_clock::now() < deadline) {
-        std::this_thread::yield();
-      }
-      open.set_value();
-    });
-    queue.reset();
-    opener.join();
-  }
-  EXPECT_FALSE(ran);
-  EXPECT_TRUE(watch.expired());
-}
-
-TEST(MainQueue, WorkWaitsForTheDrainOrRunUntilAndRunsInOrder) {
-  MainQueue::drain();  // whatever earlier tests left
-  std::vector<int> order;
-  std::thread worker([&] {
-    for (int i = 0; i < 3; ++i) MainQueue::async([&order, i] { order.push_back(i); });
-  });
-  worker.join();
-  EXPECT_TRUE(order.empty());
-  EXPECT_EQ(MainQueue::drain(), 3u);
-  EXPECT_EQ(order, (std::vector<int>{0, 1, 2}));
-  MainQueue::async(nullptr);  // nothing to run
-  EXPECT_EQ(MainQueue::drain(), 0u);
-  // The page tests wait with runUntil for their deliveries; here it gives up at its timeout.
-  EXPECT_FALSE(MainQueue::runUntil([] { return false; }, 30ms));
 }
 
 }  // namespace

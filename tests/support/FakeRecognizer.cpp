@@ -14,11 +14,6 @@ void FakeRecognizer::setObservations(std::vector<RecognizedTextObservation> obse
   observations_ = std::move(observations);
 }
 
-void FakeRecognizer::setFailure(std::optional<Error> error) {
-  std::lock_guard lock(mutex_);
-  failure_ = std::move(error);
-}
-
 void FakeRecognizer::setSupportedLanguages(std::optional<std::vector<std::string>> codes,
                                            Error error) {
   std::lock_guard lock(mutex_);
@@ -98,9 +93,14 @@ std::optional<std::vector<RecognizedTextObservation>> FakeRecognizer::recognize(
     *error = makeTextRecognitionError(TextRecognitionErrorCancelled, "cancelled");
     return std::nullopt;
   }
-  if (failure_) {
-    *error = *failure_;
-    return std::nullopt;
+  for (const auto& code : request.recognitionLanguages()) {
+    if (!supported_ ||
+        std::find(supported_->begin(), supported_->end(), code) == supported_->end()) {
+      *error =
+          makeTextRecognitionError(TextRecognitionErrorUnsupportedLanguage,
+                                   "the recognition language \"" + code + "\" is not supported");
+      return std::nullopt;
+    }
   }
   return observations_;
 }

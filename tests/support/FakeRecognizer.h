@@ -1,6 +1,7 @@
 // A scripted text recogniser for tests: it records every request it gets, answers with
-// the observations or the error it was given, and can hold recognitions until the test
-// lets them go, counting how many run at once.
+// the observations it was given, refuses codes outside its supported languages as the
+// engine does, and can hold recognitions until the test lets them go, counting how many
+// run at once. A failure is injected by wrapping it (support/ForwardingRecognizer.h).
 #pragma once
 
 #include <chrono>
@@ -35,8 +36,6 @@ class FakeRecognizer final : public TextRecognizer {
 
   void setAvailable(bool available);
   void setObservations(std::vector<RecognizedTextObservation> observations);
-  // Every recognition fails with `error` while set.
-  void setFailure(std::optional<Error> error);
   void setSupportedLanguages(std::optional<std::vector<std::string>> codes, Error error = {});
   // The long side the fake asks for fast requests (0, the default: full size).
   void setFastMaxLongSide(std::uint32_t side);
@@ -71,7 +70,6 @@ class FakeRecognizer final : public TextRecognizer {
   std::size_t running_ = 0;
   std::size_t maxRunning_ = 0;
   std::vector<RecognizedTextObservation> observations_;
-  std::optional<Error> failure_;
   std::optional<std::vector<std::string>> supported_ = std::vector<std::string>{"en-US"};
   std::uint32_t fastMaxLongSide_ = 0;
   Error supportedError_;

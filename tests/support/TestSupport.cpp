@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <filesystem>
 
+#include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Platform.h"
 
 namespace corvel::testing {
@@ -38,6 +39,11 @@ TempDir::~TempDir() {
 
 std::string fixturePath(const std::string& relative) {
   return std::string(CORVEL_FIXTURES_DIR) + "/" + relative;
+}
+
+std::string fixtureText(const std::string& relative) {
+  auto bytes = readFile(fixturePath(relative));
+  return bytes ? std::string(bytes->begin(), bytes->end()) : std::string();
 }
 
 CommandResult runCommand(const std::string& command) {

@@ -41,6 +41,8 @@ class TempDir {
 
 // Path of a committed fixture: tests/fixtures/<relative>.
 std::string fixturePath(const std::string& relative);
+// The bytes of that fixture as a string; empty when it cannot be read.
+std::string fixtureText(const std::string& relative);
 
 // Runs a shell command, returning its exit status and standard output.
 struct CommandResult {

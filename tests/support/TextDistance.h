@@ -48,4 +48,12 @@ inline std::size_t editDistance(const std::u32string& a, const std::u32string& b
   return row[b.size()];
 }
 
+// The edit distance between the two texts over the expected text's length.
+inline double characterErrorRate(const std::string& expected, const std::string& actual,
+                                 bool keepSpaces = true) {
+  std::u32string a = normalised(expected, keepSpaces), b = normalised(actual, keepSpaces);
+  if (a.empty()) return b.empty() ? 0.0 : 1.0;
+  return static_cast<double>(editDistance(a, b)) / static_cast<double>(a.size());
+}
+
 }  // namespace corvel::testing

@@ -1,6 +1,6 @@
 // `corvel ocr` on documents, each output checked by the program a user would open it
 // with: qpdf --check and pdftotext -bbox (poppler-utils) for the searchable PDF, xmllint
-// for hOCR and ALTO, the TSV's columns, a JSON parser. Then the command line's manners.
+// for hOCR and ALTO, the TSV's columns, a JSON parser.
 #include <gtest/gtest.h>
 
 #include <map>
@@ -20,14 +20,9 @@ std::string tool() { return CORVEL_TOOL_PATH; }
 std::string document(const std::string& name) { return testing::fixturePath("documents/" + name); }
 std::string run(const std::string& command) { return testing::runCommand(command).output; }
 
-double characterErrorRate(const std::string& expected, const std::string& actual) {
-  std::u32string a = testing::normalised(expected), b = testing::normalised(actual);
-  return static_cast<double>(testing::editDistance(a, b)) / static_cast<double>(a.size());
-}
-
+using testing::characterErrorRate;
 std::string fixtureText(const std::string& name) {
-  auto bytes = readFile(testing::fixturePath("ocr/" + name + ".txt"));
-  return bytes ? std::string(bytes->begin(), bytes->end()) : "";
+  return testing::fixtureText("ocr/" + name + ".txt");
 }
 
 struct TsvWord {
@@ -153,45 +148,6 @@ TEST(DocumentOutputs, EveryTiffPageInEveryFormatPassesItsReader) {
   EXPECT_EQ(firstWord["box"]["left"], words[0].left);
   EXPECT_NEAR(firstWord["box"]["normalized"]["x"].get<double>(), words[0].left / 1000, 1e-9);
   EXPECT_GT(firstWord["confidence"].get<double>(), 50);
-}
-
-TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {
-  testing::TempDir dir;
-  std::string missing = dir.file("missing.png");
-  struct Case {
-    std::string args;
-    int status;
-    std::string says;  // on standard output or error
-    std::string input = "";
-  } cases[] = {
-      {"--version", 0, "corvel 0.1"},
-      {"help ocr", 0, "usage: corvel ocr"},
-      {"ocr --help", 0, "usage: corvel ocr"},
-      {"orc x.png", 2, "did you mean 'ocr'"},
-      {"ocr --fsat x.png", 2, "did you mean '--fast'"},
-      {"ocr --fast=yes x.png", 2, "--fast takes no value"},
-      // Catalogue, engine and short codes pass; anything else lists the languages.
-      {"ocr --lang=fr-FR --lang fra --lang fr " + missing, 2, "cannot be read"},
-      {"ocr --lang klingon x.png", 2, "fr-FR (fra)"},
-      {"ocr --lang zh x.png", 2, "zh-Hans, zh-Hant"},
-      {"ocr --format=docx x.png", 2, "txt, json, hocr, alto, tsv, pdf"},
-      {"ocr -o out.docx x.png", 2, "cannot tell the format"},
-      {"ocr --format pdf x.png", 2, "-o OUT.pdf"},
-      {"ocr - -", 2, "standard input"},
-      {"md --list", 0, "insertTable"},
-      // Standard input for every command that reads a file.
-      {"lang -", 0, "fr", "Le chat dort sur la table de la cuisine pendant que nous mangeons."},
-      {"rtfd -", 2, "-: cannot be read", "not an RTFD"},
-      {"layout -", 1, "", "[]"},
-      {"md insertTable --selection 0,0 --rows 1 --columns 1 --alignment middle", 2,
-       "left, center, right"},
-  };
-  for (const auto& c : cases) {
-    std::string input = c.input.empty() ? "</dev/null" : "<<'EOF'\n" + c.input + "\nEOF";
-    auto result = testing::runCommand(tool() + " " + c.args + " 2>&1 " + input);
-    EXPECT_EQ(result.status, c.status) << c.args << "\n" << result.output;
-    EXPECT_NE(result.output.find(c.says), std::string::npos) << c.args << "\n" << result.output;
-  }
 }
 
 TEST(OcrCommand, ABlankPageFindsNothingAndADamagedFileGetsOneLine) {

@@ -1,0 +1,161 @@
+// `corvel ocr` on images as a user runs it, and the manners of the whole command line:
+// help, suggestions, misuse, standard input.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <nlohmann/json.hpp>
+
+#include "Corvelbase/platform/Image.h"
+#include "support/TestSupport.h"
+#include "support/TextDistance.h"
+
+namespace corvel {
+namespace {
+
+using testing::characterErrorRate;
+
+std::string fixtureText(const std::string& name) {
+  return testing::fixtureText("ocr/" + name + ".txt");
+}
+
+std::string tool() { return CORVEL_TOOL_PATH; }
+std::string page(const std::string& name) { return testing::fixturePath("ocr/" + name + ".png"); }
+
+TEST(OcrCommand, PrintsEachFilesTextAndReportsTheOneThatFails) {
+  testing::TempDir dir;
+  std::string errors = dir.file("errors.txt");
+  auto result = testing::runCommand(tool() + " ocr --fast --lang en-US " + page("sample") + " " +
+                                    dir.file("missing.png") + " file://" + page("lines/line-001") +
+                                    " 2>" + errors);
+  EXPECT_EQ(result.status, 1);
+  // Headers in the order given; the failed file gets none.
+  std::size_t first = result.output.find("==> " + page("sample") + " <==");
+  std::size_t second = result.output.find("==> file://" + page("lines/line-001") + " <==");
+  ASSERT_NE(first, std::string::npos) << result.output;
+  ASSERT_NE(second, std::string::npos) << result.output;
+  EXPECT_LT(first, second);
+  EXPECT_EQ(result.output.find("missing.png"), std::string::npos);
+  std::string sampleText = result.output.substr(first, second - first);
+  sampleText = sampleText.substr(sampleText.find('\n') + 1);
+  EXPECT_LT(characterErrorRate(fixtureText("sample"), sampleText), 0.02) << sampleText;
+  auto stderrText = testing::runCommand("cat " + errors).output;  // names the file and why
+  EXPECT_NE(stderrText.find("missing.png"), std::string::npos) << stderrText;
+  EXPECT_NE(stderrText.find("cannot be read"), std::string::npos) << stderrText;
+}
+
+TEST(OcrCommand, JsonGivesTheTextAndTheBlockTreeAndTheOverlayIsAPictureOfThePage) {
+  testing::TempDir dir;
+  auto result = testing::runCommand(tool() + " ocr --json --fast --overlay " +
+                                    dir.file("over.png") + " " + page("two-columns"));
+  ASSERT_EQ(result.status, 0) << result.output;
+  auto object = nlohmann::json::parse(result.output, nullptr, false);
+  ASSERT_FALSE(object.is_discarded()) << result.output;
+  const auto& file = object["files"][0];
+  EXPECT_EQ(file["file"], page("two-columns"));
+  const auto& first = file["pages"][0];
+  EXPECT_LT(characterErrorRate(fixtureText("two-columns"), first["text"].get<std::string>()), 0.02);
+  // Blocks (the schema is checked in full with the other formats): the two columns.
+  EXPECT_GE(first["blocks"].size(), 2u) << first["blocks"];
+  auto overlay = Image::initByReferencingFile(dir.file("over.png"));
+  ASSERT_TRUE(overlay->bitmap()) << overlay->failureReason();
+  EXPECT_EQ(overlay->size(), Image::initByReferencingFile(page("two-columns"))->size());
+}
+
+// Ctrl-C after the first page is out: it stays printed, the rest is reported unread,
+// and the program ends at once with 130 rather than finishing the batch.
+TEST(OcrCommand, InterruptKeepsWhatIsFinished) {
+  int out[2];
+  ASSERT_EQ(pipe(out), 0);
+  pid_t child = fork();
+  ASSERT_GE(child, 0);
+  if (child == 0) {
+    dup2(out[1], STDOUT_FILENO);
+    int quiet = open("/dev/null", O_WRONLY);
+    dup2(quiet, STDERR_FILENO);
+    close(out[0]);
+    std::string program = tool(), first = page("lines/line-001"), big = page("pages/page-01");
+    std::vector<std::string> args{program, "ocr", "--lang", "en-US", first};
+    for (int i = 0; i < 8; ++i) args.push_back(big);
+    std::vector<char*> argv;
+    for (auto& a : args) argv.push_back(a.data());
+    argv.push_back(nullptr);
+    execv(program.c_str(), argv.data());
+    _exit(127);
+  }
+  close(out[1]);
+  std::string printed;
+  char buffer[4096];
+  auto started = std::chrono::steady_clock::now();
+  // The first page's header and text, then the interrupt.
+  while (printed.find("\n", printed.find("<==") + 4) == std::string::npos) {
+    ssize_t n = read(out[0], buffer, sizeof buffer);
+    if (n <= 0) break;
+    printed.append(buffer, static_cast<std::size_t>(n));
+  }
+  kill(child, SIGINT);
+  for (ssize_t n; (n = read(out[0], buffer, sizeof buffer)) > 0;) {
+    printed.append(buffer, static_cast<std::size_t>(n));
+  }
+  close(out[0]);
+  int status = 0;
+  waitpid(child, &status, 0);
+  double seconds =
+      std::chrono::duration<double>(std::chrono::steady_clock::now() - started).count();
+  ASSERT_TRUE(WIFEXITED(status));
+  EXPECT_EQ(WEXITSTATUS(status), 130);
+  EXPECT_NE(printed.find("==> " + page("lines/line-001") + " <=="), std::string::npos) << printed;
+  // Eight full pages take several times this even two at a time and without sanitizers.
+  EXPECT_LT(seconds, 15);
+}
+
+TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {
+  testing::TempDir dir;
+  std::string missing = dir.file("missing.png");
+  struct Case {
+    std::string args;
+    int status;
+    std::string says;  // on standard output or error
+    std::string input = "";
+  } cases[] = {
+      {"--version", 0, "corvel 0.1"},
+      {"help ocr", 0, "usage: corvel ocr"},
+      {"ocr --help", 0, "usage: corvel ocr"},
+      {"orc x.png", 2, "did you mean 'ocr'"},
+      {"ocr --fsat x.png", 2, "did you mean '--fast'"},
+      {"ocr --fast=yes x.png", 2, "--fast takes no value"},
+      // Catalogue, engine and short codes pass; anything else lists the languages.
+      {"ocr --lang=fr-FR --lang fra --lang fr " + missing, 2, "cannot be read"},
+      {"ocr --lang klingon x.png", 2, "fr-FR (fra)"},
+      {"ocr --lang zh x.png", 2, "zh-Hans, zh-Hant"},
+      {"ocr --format=docx x.png", 2, "txt, json, hocr, alto, tsv, pdf"},
+      {"ocr -o out.docx x.png", 2, "cannot tell the format"},
+      {"ocr --format pdf x.png", 2, "-o OUT.pdf"},
+      {"ocr - -", 2, "standard input"},
+      {"ocr", 2, "give at least one file"},
+      {"ocr --lang", 2, "--lang"},
+      {"ocr --overlay", 2, "--overlay"},
+      // A page past its deadline is reported, and the run counts as partly failed.
+      {"ocr --timeout 0.000001 " + page("sample"), 1, "deadline"},
+      // Simplified Chinese is the one catalogue entry without fast recognition.
+      {"languages", 0, "zh-Hans   zh-Hans  Chinese Simplified     yes        no    first"},
+      {"md --list", 0, "insertTable"},
+      // Standard input for every command that reads a file.
+      {"lang -", 0, "fr", "Le chat dort sur la table de la cuisine pendant que nous mangeons."},
+      {"rtfd -", 2, "-: cannot be read", "not an RTFD"},
+      {"layout -", 1, "", "[]"},
+      {"md insertTable --selection 0,0 --rows 1 --columns 1 --alignment middle", 2,
+       "left, center, right"},
+  };
+  for (const auto& c : cases) {
+    std::string input = c.input.empty() ? "</dev/null" : "<<'EOF'\n" + c.input + "\nEOF";
+    auto result = testing::runCommand(tool() + " " + c.args + " 2>&1 " + input);
+    EXPECT_EQ(result.status, c.status) << c.args << "\n" << result.output;
+    EXPECT_NE(result.output.find(c.says), std::string::npos) << c.args << "\n" << result.output;
+  }
+}
+
+}  // namespace
+}  // namespace corvel
