@@ -1,4 +1,5 @@
-// Path pieces as the platform's string methods take them, for naming drawings by file.
+// Naming drawings by file: the identifier a drawing's files share, and the drawing file's
+// extension test.
 #pragma once
 
 #include <optional>
@@ -6,12 +7,6 @@
 
 namespace corvel::pencil {
 
-// The last component of `path`, trailing slashes ignored ("a/b.jpeg/" gives "b.jpeg"; "/"
-// gives "/").
-std::string lastPathComponent(const std::string& path);
-// What follows the last '.' of the last component, when that dot is not the component's
-// first character; "" otherwise (".pencildata" has no extension).
-std::string pathExtension(const std::string& path);
 // The identifier of a file name: its last component without its extension
 // ("/x/ABC.jpeg" gives "ABC", "a.b.c" gives "a.b", ".hidden" stays ".hidden").
 std::string identifierOfFileName(const std::string& path);

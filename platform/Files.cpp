@@ -14,6 +14,43 @@
 
 namespace corvel {
 
+namespace {
+
+// The path without its trailing slashes; "/" when it is nothing but slashes.
+std::string_view withoutTrailingSlashes(std::string_view path) {
+  auto end = path.find_last_not_of('/');
+  if (end == std::string_view::npos) return path.empty() ? path : path.substr(0, 1);
+  return path.substr(0, end + 1);
+}
+
+// Where the extension's dot stands in `path` (already without trailing slashes), or npos.
+std::size_t extensionDot(std::string_view path) {
+  auto slash = path.rfind('/');
+  std::size_t start = slash == std::string_view::npos ? 0 : slash + 1;
+  auto dot = path.rfind('.');
+  return dot == std::string_view::npos || dot <= start ? std::string_view::npos : dot;
+}
+
+}  // namespace
+
+std::string lastPathComponent(std::string_view path) {
+  path = withoutTrailingSlashes(path);
+  if (path == "/") return std::string(path);
+  auto slash = path.rfind('/');
+  return std::string(slash == std::string_view::npos ? path : path.substr(slash + 1));
+}
+
+std::string pathExtension(std::string_view path) {
+  path = withoutTrailingSlashes(path);
+  auto dot = extensionDot(path);
+  return dot == std::string_view::npos ? std::string() : std::string(path.substr(dot + 1));
+}
+
+std::string deletingPathExtension(std::string_view path) {
+  path = withoutTrailingSlashes(path);
+  return std::string(path.substr(0, extensionDot(path)));
+}
+
 std::optional<Data> readFile(const std::string& path) {
   std::error_code ec;
   if (!std::filesystem::is_regular_file(path, ec)) return std::nullopt;
