@@ -11,6 +11,7 @@
 #include <new>
 
 #include "Corvelbase/platform/Files.h"
+#include "platform/SiblingFiles.h"
 
 namespace corvel {
 
@@ -280,9 +281,7 @@ bool FileWrapper::writeToPath(const std::string& path) const {
   std::string staging;
   bool made = false;
   for (int attempt = 0; !made && attempt < 16; ++attempt) {
-    staging = (parent / ("." + target.filename().string() + "." + makeUUIDString().substr(0, 8) +
-                         std::to_string(attempt)))
-                  .string();
+    staging = detail::uniqueSibling(target.string(), attempt);
     made = mkdir(staging.c_str(), 0777) == 0;
     if (!made && errno != EEXIST) return false;
   }
