@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "Corvelbase/platform/Platform.h"
+#include "platform/Backends.h"
 
 namespace corvel {
 
@@ -217,33 +218,16 @@ class InternalMainQueue final : public MainQueueDispatcher {
   std::deque<std::function<void()>> pending_;
 };
 
-struct DispatcherState {
-  std::mutex mutex;
-  std::shared_ptr<MainQueueDispatcher> installed;
-  std::shared_ptr<InternalMainQueue> internal = std::make_shared<InternalMainQueue>();
-};
-
-DispatcherState& dispatcherState() {
-  static DispatcherState* state = new DispatcherState;  // used until exit
-  return *state;
-}
-
 std::shared_ptr<InternalMainQueue> internalQueue() {
-  std::lock_guard lock(dispatcherState().mutex);
-  return dispatcherState().internal;
+  static const auto* queue =  // never destroyed: used until exit
+      new std::shared_ptr<InternalMainQueue>(std::make_shared<InternalMainQueue>());
+  return *queue;
 }
 
 }  // namespace
 
-void PlatformRegistry::setMainQueueDispatcher(std::shared_ptr<MainQueueDispatcher> dispatcher) {
-  std::lock_guard lock(dispatcherState().mutex);
-  dispatcherState().installed = std::move(dispatcher);
-}
-
-std::shared_ptr<MainQueueDispatcher> PlatformRegistry::mainQueueDispatcher() {
-  std::lock_guard lock(dispatcherState().mutex);
-  if (dispatcherState().installed) return dispatcherState().installed;
-  return dispatcherState().internal;
+std::shared_ptr<MainQueueDispatcher> detail::internalMainQueueDispatcher() {
+  return internalQueue();
 }
 
 void MainQueue::async(std::function<void()> work) {

@@ -8,6 +8,7 @@
 #include <thread>
 
 #include "Corvelbase/platform/TextRecognizer.h"
+#include "platform/Backends.h"
 #include "platform/LanguageDetection.h"
 #include "platform/RecognitionLanguages.h"
 #include "platform/image/BitmapNative.h"
@@ -461,5 +462,10 @@ TesseractRecognizer::Statistics TesseractRecognizer::statistics() const {
 }
 
 void TesseractRecognizer::releaseIdleEngines() { impl_->reader.pool().clear(); }
+
+// This backend is the registry's default recogniser.
+std::shared_ptr<TextRecognizer> detail::makeDefaultTextRecognizer() {
+  return TesseractRecognizer::init();
+}
 
 }  // namespace corvel
