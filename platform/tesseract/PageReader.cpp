@@ -120,9 +120,9 @@ PageReader::PageReader(std::string dataPath, std::uint64_t maxIdleModelBytes,
                        unsigned maxConcurrent)
     : pool_(std::move(dataPath), maxIdleModelBytes), gate_(maxConcurrent) {}
 
-TesseractRecognizer::Statistics PageReader::statistics() const {
+detail::TesseractStatistics PageReader::statistics() const {
   std::lock_guard lock(statsMutex_);
-  TesseractRecognizer::Statistics stats = stats_;
+  detail::TesseractStatistics stats = stats_;
   stats.idleEngines = pool_.idleCount();
   return stats;
 }

@@ -19,6 +19,7 @@
 #include "Corvelbase/platform/TextRecognizer.h"
 #include "platform/tesseract/EnginePool.h"
 #include "platform/tesseract/PagePreparation.h"
+#include "platform/tesseract/TesseractStatistics.h"
 
 namespace corvel::tesseract_backend {
 
@@ -138,7 +139,7 @@ class PageReader {
 
   EnginePool& pool() { return pool_; }
   const EnginePool& pool() const { return pool_; }
-  TesseractRecognizer::Statistics statistics() const;
+  detail::TesseractStatistics statistics() const;
 
   // One reading of `page` with `models` and the settings. False with *error when the
   // engine cannot start, fails, or is stopped (cancelled, past the deadline, or
@@ -181,7 +182,7 @@ class PageReader {
   EnginePool pool_;
   Gate gate_;
   mutable std::mutex statsMutex_;
-  TesseractRecognizer::Statistics stats_;
+  detail::TesseractStatistics stats_;
 };
 
 }  // namespace corvel::tesseract_backend

@@ -13,6 +13,7 @@
 #include "platform/RecognitionLanguages.h"
 #include "platform/image/BitmapNative.h"
 #include "platform/tesseract/PageReader.h"
+#include "platform/tesseract/TesseractStatistics.h"
 
 namespace corvel {
 
@@ -457,8 +458,14 @@ std::uint32_t TesseractRecognizer::maxUsefulLongSide(const TextRecognitionReques
                                                                 : 0;
 }
 
-TesseractRecognizer::Statistics TesseractRecognizer::statistics() const {
-  return impl_->reader.statistics();
+struct TesseractRecognizerAccess {
+  static const TesseractRecognizer::Impl& impl(const TesseractRecognizer& recognizer) {
+    return *recognizer.impl_;
+  }
+};
+
+detail::TesseractStatistics detail::tesseractStatistics(const TesseractRecognizer& recognizer) {
+  return TesseractRecognizerAccess::impl(recognizer).reader.statistics();
 }
 
 void TesseractRecognizer::releaseIdleEngines() { impl_->reader.pool().clear(); }
