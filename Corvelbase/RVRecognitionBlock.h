@@ -254,7 +254,7 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
  private:
   // What a container knows about its children while nothing has changed behind it, so
   // that a block added below all of them costs O(1): the text is extended instead of
-  // rebuilt and the children are not rescanned. Defined in RVRecognitionBlockAssembly.cpp.
+  // rebuilt and the children are not rescanned. Defined in ocr/AssemblyCache.h.
   struct AssemblyCache;
 
   bool containsChild(const std::shared_ptr<RVRecognitionBlock>& block) const;
