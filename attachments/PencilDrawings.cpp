@@ -62,7 +62,7 @@ PencilDataDictionary pencilDataDictionaryForRange(const AttributedString& text, 
           auto strokes = picture->pencilAttachment()->strokeData();
           auto wrapper = picture->fileWrapper();
           if (!wrapper || !wrapper->filename()) continue;
-          std::string identifier = pencil::identifierOfFileName(*wrapper->filename());
+          std::string identifier = detail::identifierOfFileName(*wrapper->filename());
           if (strokes)
             dictionary[identifier] = std::move(*strokes);
           else

@@ -15,8 +15,8 @@ std::shared_ptr<TextAttachment> attachmentIn(const AttributeValue* value) {
 }
 
 bool isDrawingFile(const FileWrapper& wrapper) {
-  return pencil::hasPencilDataExtension(wrapper.preferredFilename()) ||
-         pencil::hasPencilDataExtension(wrapper.filename());
+  return detail::hasPencilDataExtension(wrapper.preferredFilename()) ||
+         detail::hasPencilDataExtension(wrapper.filename());
 }
 
 }  // namespace
@@ -30,14 +30,14 @@ std::optional<std::string> identifierForAttachment(
   const auto& name =
       wrapper->preferredFilename() ? wrapper->preferredFilename() : wrapper->filename();
   if (!name) return std::nullopt;
-  return pencil::identifierOfFileName(*name);
+  return detail::identifierOfFileName(*name);
 }
 
 std::optional<std::string> fileIDForAttachment(const AttributedString& /*text*/,
                                                const std::shared_ptr<TextAttachment>& attachment) {
   auto wrapper = attachment ? attachment->fileWrapper() : nullptr;
   if (!wrapper || !wrapper->filename()) return std::nullopt;
-  return pencil::identifierOfFileName(*wrapper->filename());
+  return detail::identifierOfFileName(*wrapper->filename());
 }
 
 PencilAttachmentDictionary removePencilAttachments(AttributedString& text) {

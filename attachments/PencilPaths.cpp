@@ -3,7 +3,7 @@
 #include "Corvelbase/RVPencilAttachment.h"
 #include "Corvelbase/platform/Files.h"
 
-namespace corvel::pencil {
+namespace corvel::detail {
 
 std::string identifierOfFileName(const std::string& path) {
   return deletingPathExtension(lastPathComponent(path));
@@ -13,4 +13,4 @@ bool hasPencilDataExtension(const std::optional<std::string>& name) {
   return name && pathExtension(*name) == RVPencilDataExtension;
 }
 
-}  // namespace corvel::pencil
+}  // namespace corvel::detail

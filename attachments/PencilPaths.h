@@ -5,7 +5,7 @@
 #include <optional>
 #include <string>
 
-namespace corvel::pencil {
+namespace corvel::detail {
 
 // The identifier of a file name: its last component without its extension
 // ("/x/ABC.jpeg" gives "ABC", "a.b.c" gives "a.b", ".hidden" stays ".hidden").
@@ -13,4 +13,4 @@ std::string identifierOfFileName(const std::string& path);
 // Whether `name` has the exact extension "pencildata" (case matters).
 bool hasPencilDataExtension(const std::optional<std::string>& name);
 
-}  // namespace corvel::pencil
+}  // namespace corvel::detail

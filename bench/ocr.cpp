@@ -37,7 +37,7 @@
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
-#include "TesseractCommand.h"
+#include "bench/TesseractCommand.h"
 #include "platform/tesseract/TesseractStatistics.h"
 #include "support/TextDistance.h"
 

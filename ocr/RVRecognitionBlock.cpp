@@ -10,8 +10,8 @@
 #include <utility>
 #include <vector>
 
-#include "AssemblyCache.h"
 #include "Corvelbase/platform/Files.h"
+#include "ocr/AssemblyCache.h"
 
 namespace corvel {
 

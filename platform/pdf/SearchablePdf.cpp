@@ -31,7 +31,7 @@
 #include "platform/image/BitmapNative.h"
 #include "platform/pdf/PdfPages.h"
 
-namespace corvel::document_backend {
+namespace corvel::detail {
 
 PageFrame pageFrame(QPDFPageObjectHelper& page) {
   PageFrame frame;
@@ -462,4 +462,4 @@ bool writeSearchablePdf(const Document& document, const std::vector<TextLayerPag
   }
 }
 
-}  // namespace corvel::document_backend
+}  // namespace corvel::detail

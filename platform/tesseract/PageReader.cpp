@@ -10,7 +10,7 @@
 
 #include "platform/image/BitmapNative.h"
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 namespace {
 
@@ -561,4 +561,4 @@ void PageReader::collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult
     out->text += text + "\n";
   } while (it->PageIterator::Next(tesseract::RIL_TEXTLINE));
 }
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

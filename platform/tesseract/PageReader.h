@@ -21,7 +21,7 @@
 #include "platform/tesseract/PagePreparation.h"
 #include "platform/tesseract/TesseractStatistics.h"
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 struct PixDeleter {
   void operator()(PIX* pix) const { pixDestroy(&pix); }
@@ -60,7 +60,7 @@ struct Page {
   int fileResolution = 0;  // what the file states, 0 when nothing
   int resolution = 0;      // told to the engine; 0: the engine estimates it
   // Where the measures saw characters, in this page's pixels; empty once turned.
-  std::vector<tesseract_backend::PageBox> characters;
+  std::vector<detail::PageBox> characters;
 
   void replace(PIX* replacement) {
     owned.reset(replacement);
@@ -185,4 +185,4 @@ class PageReader {
   detail::TesseractStatistics stats_;
 };
 
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

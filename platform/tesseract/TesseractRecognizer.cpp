@@ -17,22 +17,22 @@
 
 namespace corvel {
 
-using tesseract_backend::judge;
-using tesseract_backend::measurePage;
-using tesseract_backend::Page;
-using tesseract_backend::PageBox;
-using tesseract_backend::PagePlan;
-using tesseract_backend::PageReader;
-using tesseract_backend::PassResult;
-using tesseract_backend::PassSettings;
-using tesseract_backend::PlanLimits;
-using tesseract_backend::planPage;
-using tesseract_backend::preparePage;
-using tesseract_backend::Reading;
-using tesseract_backend::Stop;
-using tesseract_backend::Threshold;
-using tesseract_backend::toWhole;
-using tesseract_backend::Watch;
+using detail::judge;
+using detail::measurePage;
+using detail::Page;
+using detail::PageBox;
+using detail::PagePlan;
+using detail::PageReader;
+using detail::PassResult;
+using detail::PassSettings;
+using detail::PlanLimits;
+using detail::planPage;
+using detail::preparePage;
+using detail::Reading;
+using detail::Stop;
+using detail::Threshold;
+using detail::toWhole;
+using detail::Watch;
 
 namespace {
 
