@@ -31,7 +31,7 @@
 #include <string>
 #include <vector>
 
-#include "TesseractCommand.h"
+#include "bench/TesseractCommand.h"
 
 namespace {
 

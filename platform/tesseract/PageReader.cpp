@@ -10,7 +10,7 @@
 
 #include "platform/image/BitmapNative.h"
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 namespace {
 
@@ -124,9 +124,9 @@ PageReader::PageReader(std::string dataPath, std::uint64_t maxIdleModelBytes,
                        unsigned maxConcurrent)
     : pool_(std::move(dataPath), maxIdleModelBytes), gate_(maxConcurrent) {}
 
-TesseractRecognizer::Statistics PageReader::statistics() const {
+detail::TesseractStatistics PageReader::statistics() const {
   std::lock_guard lock(statsMutex_);
-  TesseractRecognizer::Statistics stats = stats_;
+  detail::TesseractStatistics stats = stats_;
   stats.idleEngines = pool_.idleCount();
   return stats;
 }
@@ -607,4 +607,4 @@ void PageReader::collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult
     out->text += text + "\n";
   }
 }
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail
