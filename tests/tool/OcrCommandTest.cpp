@@ -65,7 +65,7 @@ TEST(OcrCommand, JsonGivesTheTextAndTheBlockTreeAndTheOverlayIsAPictureOfThePage
 }
 
 // Ctrl-C after the first page is out: it stays printed, the rest is reported unread,
-// and the program ends at once with 130 rather than finishing the batch.
+// and the program ends with 130 rather than finishing the batch.
 TEST(OcrCommand, InterruptKeepsWhatIsFinished) {
   int out[2];
   ASSERT_EQ(pipe(out), 0);
@@ -73,8 +73,7 @@ TEST(OcrCommand, InterruptKeepsWhatIsFinished) {
   ASSERT_GE(child, 0);
   if (child == 0) {
     dup2(out[1], STDOUT_FILENO);
-    int quiet = open("/dev/null", O_WRONLY);
-    dup2(quiet, STDERR_FILENO);
+    dup2(out[1], STDERR_FILENO);
     close(out[0]);
     std::string program = tool(), first = page("lines/line-001"), big = page("pages/page-01");
     std::vector<std::string> args{program, "ocr", "--lang", "en-US", first};
@@ -94,7 +93,6 @@ TEST(OcrCommand, InterruptKeepsWhatIsFinished) {
     if (n <= 0) break;
     printed.append(buffer, static_cast<std::size_t>(n));
   }
-  auto interrupted = std::chrono::steady_clock::now();
   kill(child, SIGINT);
   for (ssize_t n; (n = read(out[0], buffer, sizeof buffer)) > 0;) {
     printed.append(buffer, static_cast<std::size_t>(n));
@@ -102,14 +100,17 @@ TEST(OcrCommand, InterruptKeepsWhatIsFinished) {
   close(out[0]);
   int status = 0;
   waitpid(child, &status, 0);
-  double seconds =
-      std::chrono::duration<double>(std::chrono::steady_clock::now() - interrupted).count();
   ASSERT_TRUE(WIFEXITED(status));
   EXPECT_EQ(WEXITSTATUS(status), 130);
   EXPECT_NE(printed.find("==> " + page("lines/line-001") + " <=="), std::string::npos) << printed;
-  // The pages being read stop inside the engine; the eight full pages would take many
-  // times this even two at a time and without sanitizers.
-  EXPECT_LT(seconds, 10);
+  // At most the two pages being read when the interrupt came could have finished: the
+  // rest, waiting or stopped inside the engine, are reported as not read.
+  std::size_t stopped = 0;
+  for (std::size_t at = 0;
+       (at = printed.find("interrupted before it was read", at)) != std::string::npos; ++at) {
+    ++stopped;
+  }
+  EXPECT_GE(stopped, 6u) << printed;
 }
 
 TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {

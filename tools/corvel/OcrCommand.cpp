@@ -32,13 +32,13 @@
 #include <string>
 #include <vector>
 
-#include "Commands.h"
 #include "Corvelbase/RVDocumentOCR.h"
 #include "Corvelbase/RVDocumentOutput.h"
 #include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/TextRecognizer.h"
-#include "Overlay.h"
+#include "tools/corvel/Commands.h"
+#include "tools/corvel/Overlay.h"
 
 namespace corvel::tool {
 
@@ -268,10 +268,9 @@ class SpooledInput {
 
 std::string numberedName(const std::string& base, std::size_t index, std::size_t count) {
   if (count == 1) return base;
-  std::size_t dot = base.rfind('.');
-  std::size_t slash = base.rfind('/');
-  if (dot == std::string::npos || (slash != std::string::npos && dot < slash)) dot = base.size();
-  return base.substr(0, dot) + "-" + std::to_string(index + 1) + base.substr(dot);
+  std::string extension = pathExtension(base);
+  return deletingPathExtension(base) + "-" + std::to_string(index + 1) +
+         (extension.empty() ? "" : "." + extension);
 }
 
 // --- progress ---------------------------------------------------------------------------

@@ -8,9 +8,9 @@
 #include <string>
 #include <thread>
 
-#include "Commands.h"
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
+#include "tools/corvel/Commands.h"
 
 namespace corvel::tool {
 
