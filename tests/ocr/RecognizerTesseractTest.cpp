@@ -167,8 +167,9 @@ TEST_F(TesseractRecognition, HardPagesAreReadWhole) {
   EXPECT_LT(errorRate("photographed", outcome), 0.05) << outcome.text();
 }
 
-// Pages of the kinds real documents brought that went wrong, each small (made by
-// fixtures/ocr/render_hard.py --fixtures) and each failing before in the way named.
+// Pages of the kinds real documents brought that went wrong, each small and each failing
+// before in the way named. The benchmark's page generator made them and remakes them:
+// bench/render_hard.py tests/fixtures/ocr/hard --fixtures
 TEST_F(TesseractRecognition, HardDocumentsAreReadAtBothLevels) {
   struct Case {
     const char* file;
