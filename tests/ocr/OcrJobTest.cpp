@@ -91,9 +91,7 @@ TEST_F(OcrJob, RequestSettingsFollowThePlatformVersion) {
   } cases[] = {
       // with no codes the newest systems detect the language, older ones read English
       {"newest, fast", {}, {}, true, 3, {}, true},
-      {"13", {13, 0, 0}, {}, false, 3, {}, true},
       {"12, fast", {12, 6, 0}, {}, true, 2, {"en-US"}, false},
-      {"11", {11, 0, 0}, {}, false, 2, {"en-US"}, false},
       {"10.15", {10, 15, 0}, {}, false, std::nullopt, {"en-US"}, false},
       // given codes are passed on, the forced-primary one first
       {"newest, French and Japanese", {}, {"fr-FR", "ja-JP"}, false, 3, {"ja-JP", "fr-FR"}, false},
@@ -276,16 +274,9 @@ TEST_F(OcrJob, ARecogniserErrorReachesTheCompletionUnchangedAndIsLogged) {
 }
 
 TEST_F(OcrJob, EveryBadImageEndsInAnErrorSayingWhatWentWrong) {
+  // The image's own reasons are the image suite's; here each way in reaches the completion.
   testing::TempDir dir;
-  auto png = readFile(testing::fixturePath("ocr/one-column.png")).value();
-  auto write = [&](const std::string& name, const Data& bytes) {
-    EXPECT_TRUE(writeFileAtomically(dir.file(name), bytes));
-    return dir.file(name);
-  };
-  Data truncated(png.begin(), png.begin() + static_cast<std::ptrdiff_t>(png.size() / 3));
-  Data noPixels = png, huge = png;  // PNG headers claiming 0 x 0 and 30000 x 30000 pixels
-  for (std::size_t i = 16; i < 24; ++i) noPixels[i] = 0, huge[i] = (i % 4 == 2) ? 0x75 : 0;
-  huge[19] = huge[23] = 0x30;
+  ASSERT_TRUE(writeFileAtomically(dir.file("z.png"), {}));
   // Sources with a scheme go in as URLs, the others as paths, but for the two null images.
   auto start = [](const std::string& source, RVVisionOCR::Completion done) {
     if (source == "null image") return RVVisionOCR::ocrImage(nullptr, {}, false, done);
@@ -299,10 +290,7 @@ TEST_F(OcrJob, EveryBadImageEndsInAnErrorSayingWhatWentWrong) {
     const char* reasonWord;
   } cases[] = {
       {"", "no file"},
-      {write("t.png", truncated), "corrupt"},
-      {write("z.png", {}), "not an image"},
-      {write("n.png", noPixels), "PNG"},
-      {write("h.png", huge), "too large"},
+      {dir.file("z.png"), "not an image"},
       {"https://example.invalid/p.png", "https"},
       {"file:///no/such/page.png", "cannot be read"},
       {"null image", "no image"},
@@ -399,7 +387,6 @@ TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
                       {{"yue-Hans", "en-US"}, true},
                       {{"en-US"}, false},  // no secondary codes, even alone
                       {{"ja-JP", "ko-KR"}, false},
-                      {{"ja-JP", "xx-XX"}, false},
                       {{"xx-XX"}, false}};
   for (const auto& c : combinations)
     EXPECT_EQ(RVVisionOCR::isLanguageCombinationValid(c.codes), c.valid)
@@ -412,7 +399,6 @@ TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
   struct Order {
     Codes in, out;
   } orders[] = {{{}, {}},
-                {{"en-US", "fr-FR"}, {"en-US", "fr-FR"}},
                 {{"en-US", "ko-KR", "ja-JP"}, {"ko-KR", "en-US", "ja-JP"}},
                 {{"xx-XX", "de-DE", "yue-Hant"}, {"yue-Hant", "xx-XX", "de-DE"}}};
   auto job = RVVisionOCR::init();

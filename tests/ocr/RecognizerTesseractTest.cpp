@@ -1,7 +1,7 @@
 // The Tesseract recogniser beyond what every recogniser does (RecognizerContractTest):
-// levels, orientation, hard pages, deadlines, language data, the engine pool and its
-// failures; and whole recognition jobs on the committed fixture pages, whose reading-order
-// text must match the page's source within a small character error rate.
+// hard pages, deadlines, language data, the engine pool and its failures; and whole recognition
+// jobs on the committed fixture pages, whose reading-order text must match the page's source within
+// a small character error rate.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -77,18 +77,12 @@ double errorRate(const std::string& name, const Outcome& outcome) {
 
 // The page turned a quarter anticlockwise, as a phone photo held sideways comes out.
 std::shared_ptr<Bitmap> turnedQuarter(const Bitmap& page) {
-  Data rgba = page.rgba();
-  std::uint32_t w = page.width(), h = page.height();
-  Data turned(rgba.size());
-  for (std::uint32_t y = 0; y < h; ++y) {
-    for (std::uint32_t x = 0; x < w; ++x) {
-      // (x, y) goes to (y, w - 1 - x) in an image h wide and w high.
-      std::size_t from = (static_cast<std::size_t>(y) * w + x) * 4;
-      std::size_t to = (static_cast<std::size_t>(w - 1 - x) * h + y) * 4;
-      std::copy_n(&rgba[from], 4, &turned[to]);
-    }
-  }
-  return Bitmap::fromRGBA(h, w, turned.data(), turned.size());
+  Data rgba = page.rgba(), turned(rgba.size());
+  std::size_t w = page.width(), h = page.height();
+  for (std::size_t y = 0; y < h; ++y)
+    for (std::size_t x = 0; x < w; ++x)  // (x, y) goes to (y, w - 1 - x)
+      std::copy_n(&rgba[(y * w + x) * 4], 4, &turned[((w - 1 - x) * h + y) * 4]);
+  return Bitmap::fromRGBA(page.height(), page.width(), turned.data(), turned.size());
 }
 
 class TesseractRecognition : public ::testing::Test {
@@ -100,16 +94,6 @@ class TesseractRecognition : public ::testing::Test {
   static std::shared_ptr<TesseractRecognizer> recognizer_;
 };
 std::shared_ptr<TesseractRecognizer> TesseractRecognition::recognizer_;
-
-// The render script draws the heading at (103, 103) on the 1240 x 1000 page: its box
-// starts near x 0.083 and its top edge near y 1 - 0.103, whatever the page's proportions.
-TEST_F(TesseractRecognition, BoxesAreNormalisedByThePagesOwnWidthAndHeight) {
-  auto outcome = perform(fixture("two-columns"), TextRecognitionLevelFast, {"en-US"});
-  ASSERT_TRUE(outcome.results && !outcome.results->empty());
-  const Rect& heading = outcome.results->front().boundingBox;
-  EXPECT_NEAR(heading.origin.x, 103.0 / 1240, 0.005);
-  EXPECT_NEAR(rectGetMaxY(heading), 1 - 103.0 / 1000, 0.015);
-}
 
 // ---- Whole jobs, through the shared queue at once as a host's batch would run them.
 
@@ -131,6 +115,8 @@ TEST_F(TesseractRecognition, JobsReadEachPageInReadingOrderCloseToItsSource) {
       {"russian", {}, true, 0.03},
       {"german", {}, false, 0.02},
       {"japanese", {}, true, 0.05, false},
+      // unevenly lit and soft, as a phone photographs a page
+      {"photographed", {"en-US"}, true, 0.05},
   };
   for (Page& page : pages) {
     RVVisionOCR::ocrImageAtPath(
@@ -154,17 +140,14 @@ TEST_F(TesseractRecognition, JobsReadEachPageInReadingOrderCloseToItsSource) {
   }
 }
 
-TEST_F(TesseractRecognition, HardPagesAreReadWhole) {
-  // Accurate turns a page on its side upright; an unevenly lit photograph keeps every line.
+// Accurate turns a page lying on its side upright before reading it.
+TEST_F(TesseractRecognition, APageOnItsSideIsTurnedAndReadWhole) {
   auto page = image("two-columns")->bitmap();
   ASSERT_TRUE(page);
   auto outcome = perform(ImageRequestHandler::initWithCGImage(turnedQuarter(*page), {}),
                          TextRecognitionLevelAccurate, {"en-US"});
   ASSERT_FALSE(outcome.error);
   EXPECT_LT(errorRate("two-columns", outcome), 0.03) << outcome.text();
-  outcome = perform(fixture("photographed"), TextRecognitionLevelFast, {"en-US"});
-  ASSERT_FALSE(outcome.error);
-  EXPECT_LT(errorRate("photographed", outcome), 0.05) << outcome.text();
 }
 
 // Pages of the kinds real documents brought that went wrong, each small and each failing
@@ -249,10 +232,6 @@ TEST(TesseractLanguageData, OnlyInstalledLanguagesAreOfferedInOurOrder) {
   EXPECT_EQ(*codes,
             (std::vector<std::string>{"en-US", "fr-FR", "de-DE", "it-IT", "pt-BR", "es-ES", "ru-RU",
                                       "uk-UA", "zh-Hans", "zh-Hant", "ja-JP", "ko-KR"}));
-  EXPECT_EQ(TesseractRecognizer::modelForLanguageCode("yue-Hans"), "chi_sim");
-  // Only whole, exactly spelled codes.
-  EXPECT_EQ(TesseractRecognizer::modelForLanguageCode("en"), "");
-  EXPECT_EQ(TesseractRecognizer::modelForLanguageCode("EN-US"), "");
 
   // A folder with English alone: only English is offered, French fails as not installed.
   testing::TempDir dir;
