@@ -128,6 +128,15 @@ TEST(DocumentOutputs, EveryTiffPageInEveryFormatPassesItsReader) {
   EXPECT_EQ(xpathCount(dir.file("out.hocr"), "//*[@class='ocr_page']"), 2);
   EXPECT_EQ(xpathCount(dir.file("out.hocr"), "//*[@class='ocrx_word']"),
             static_cast<int>(words.size()));
+  // hOCR's boxes are left, top, right, bottom: its first word sits where the TSV puts it.
+  auto at = [](double v) { return std::to_string(static_cast<int>(v)); };
+  const TsvWord& w = words[0];
+  EXPECT_EQ(
+      run("xmllint --xpath \"string((//*[@class='ocrx_word'])[1]/@title)\" " + dir.file("out.hocr"))
+          .rfind("bbox " + at(w.left) + " " + at(w.top) + " " + at(w.left + w.width) + " " +
+                     at(w.top + w.height) + ";",
+                 0),
+      0u);
   EXPECT_EQ(xpathCount(dir.file("out.xml"), "//*[local-name()='Page']"), 2);
   EXPECT_EQ(xpathCount(dir.file("out.xml"), "//*[local-name()='String']"),
             static_cast<int>(words.size()));
