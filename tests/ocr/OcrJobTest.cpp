@@ -140,67 +140,58 @@ TEST_F(OcrJob, EachObservationsBestReadingBecomesALineBlock) {
   EXPECT_NE(delivery.text.find(u"half sure"), String::npos);
 }
 
-// Lines of a receipt as an engine places them: items and prices in blocks of their own
-// side by side, then a paragraph of two long lines.
-std::vector<RecognizedTextObservation> receiptLines() {
-  auto at = [](const char* text, Rect box, std::size_t block, std::size_t paragraph) {
-    RecognizedTextObservation o = line(text, 0.9f, box);
-    o.block = block;
-    o.paragraph = paragraph;
-    return o;
-  };
-  return {at("MILK", Rect(0.1, 0.80, 0.2, 0.04), 0, 0),
-          at("BREAD", Rect(0.1, 0.70, 0.2, 0.04), 0, 0),
-          at("1.99", Rect(0.8, 0.805, 0.1, 0.04), 1, 1),
-          at("2.49", Rect(0.8, 0.695, 0.1, 0.04), 1, 1),
-          at("Thank you for shopping with us today", Rect(0.1, 0.40, 0.8, 0.04), 2, 2),
-          at("and come back again soon please", Rect(0.1, 0.35, 0.7, 0.04), 2, 2)};
+// Lines as an engine places them, each with its block (and paragraph).
+RecognizedTextObservation at(const char* text, Rect box, std::size_t block) {
+  RecognizedTextObservation o = line(text, 0.9f, box);
+  o.block = o.paragraph = block;
+  return o;
 }
 
 TEST_F(OcrJob, ReadingOrdersGiveTheEnginesParagraphsAndKeepRowsTogether) {
-  fake_->setObservations(receiptLines());
+  // A receipt: items and prices in blocks side by side, then a paragraph of long lines.
+  const std::vector<RecognizedTextObservation> receipt = {
+      at("MILK", Rect(0.1, 0.80, 0.2, 0.04), 0),
+      at("BREAD", Rect(0.1, 0.70, 0.2, 0.04), 0),
+      at("1.99", Rect(0.8, 0.805, 0.1, 0.04), 1),
+      at("2.49", Rect(0.8, 0.695, 0.1, 0.04), 1),
+      at("Thank you for shopping", Rect(0.1, 0.40, 0.8, 0.04), 2),
+      at("and come back soon", Rect(0.1, 0.35, 0.7, 0.04), 2)};
+  // Two columns of running text, whose lines align row by row.
+  const std::vector<RecognizedTextObservation> columns = {
+      at("the first column runs on", Rect(0.05, 0.8, 0.4, 0.03), 0),
+      at("and on down the page", Rect(0.05, 0.75, 0.4, 0.03), 0),
+      at("the second column starts", Rect(0.55, 0.8, 0.4, 0.03), 1),
+      at("and ends at the foot", Rect(0.55, 0.75, 0.4, 0.03), 1)};
   struct Case {
     RVReadingOrder order;
+    const std::vector<RecognizedTextObservation>& lines;
     String text;
+    std::size_t columns;  // in the tree: one per block, but rows side by side make one
   } cases[] = {
-      {RVReadingOrderEngine,
-       u"MILK\nBREAD\n\n1.99\n2.49\n\nThank you for shopping with us today\n"
-       u"and come back again soon please"},
-      {RVReadingOrderRows,
-       u"MILK 1.99\nBREAD 2.49\n\nThank you for shopping with us today\n"
-       u"and come back again soon please"},
+      {RVReadingOrderEngine, receipt,
+       u"MILK\nBREAD\n\n1.99\n2.49\n\nThank you for shopping\nand come back soon", 3},
+      {RVReadingOrderRows, receipt,
+       u"MILK 1.99\nBREAD 2.49\n\nThank you for shopping\nand come back soon", 2},
+      // Long lines side by side stay apart.
+      {RVReadingOrderRows, columns,
+       u"the first column runs on\nand on down the page\n\n"
+       u"the second column starts\nand ends at the foot",
+       2},
   };
   for (const auto& c : cases) {
+    fake_->setObservations(c.lines);
     Delivery delivery;
     auto job = RVVisionOCR::init();
     job->setReadingOrder(c.order);
     job->startOcrCGImage(whitePage(), {}, false, recordInto(&delivery));
     finish(job);
     EXPECT_EQ(delivery.text, c.text) << c.order;
-    // The tree holds the same order: one column per block (rows make one of two).
-    const auto& columns = *job->layoutAnalyser()->layoutBlocks();
-    ASSERT_EQ(columns.size(), c.order == RVReadingOrderRows ? 2u : 3u);
-    EXPECT_EQ(columns[0]->level(), RVRecognitionBlockLevelColumn);
+    // The tree holds the same order.
+    const auto& tree = *job->layoutAnalyser()->layoutBlocks();
+    ASSERT_EQ(tree.size(), c.columns) << c.order;
+    EXPECT_EQ(tree[0]->level(), RVRecognitionBlockLevelColumn);
     EXPECT_EQ(job->layoutAnalyser()->text(), c.text);
   }
-  // Two columns of running text stay apart however their lines align.
-  auto text = [](const char* t, double x, double y, std::size_t block) {
-    RecognizedTextObservation o = line(t, 0.9f, Rect(x, y, 0.4, 0.03));
-    o.block = o.paragraph = block;
-    return o;
-  };
-  fake_->setObservations({text("the first column runs on here", 0.05, 0.8, 0),
-                          text("and on down the page", 0.05, 0.75, 0),
-                          text("the second column starts here", 0.55, 0.8, 1),
-                          text("and ends at the foot", 0.55, 0.75, 1)});
-  Delivery delivery;
-  auto job = RVVisionOCR::init();
-  job->setReadingOrder(RVReadingOrderRows);
-  job->startOcrCGImage(whitePage(), {}, false, recordInto(&delivery));
-  finish(job);
-  EXPECT_EQ(delivery.text,
-            u"the first column runs on here\nand on down the page\n\n"
-            u"the second column starts here\nand ends at the foot");
 }
 
 TEST_F(OcrJob, StoppingARunningJobStopsItsRecognitionWhereCancellingLetsItFinish) {
