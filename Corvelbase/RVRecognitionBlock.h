@@ -148,10 +148,12 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
   // 2^64 give 2^64 - 1. The text hash is FNV-1a over the UTF-16 units (0 for nil), so it
   // is stable across runs.
   std::uint64_t hash() const;
-  // Value equality: the same object, or (in this order) equal hashes, levels, confidences
-  // closer than single-precision epsilon, identical boxes (all four doubles; a NaN box is
-  // equal only to itself) and equal texts (two nil texts are equal). Children, matchType
-  // and lineSpacing do not count. False for nullptr.
+  // Value equality: the same object, or (in this order) `other` of this block's class or
+  // a subclass of it, equal hashes, levels, confidences closer than single-precision
+  // epsilon, identical boxes (all four doubles; a NaN box is equal only to itself) and
+  // equal texts (two nil texts are equal). Children, matchType and lineSpacing do not
+  // count. False for nullptr. Not symmetric across classes: a plain block may equal an
+  // instance of a host's subclass, but the subclass's instance never equals a plain block.
   bool isEqual(const std::shared_ptr<RVRecognitionBlock>& other) const;
   bool isEqual(const RVRecognitionBlock* other) const;
   // "(98.50%) 'abc'": confidence with two decimals, then the text (nil prints "(null)").
@@ -252,7 +254,7 @@ class CORVEL_EXPORT RVRecognitionBlock : public std::enable_shared_from_this<RVR
  private:
   // What a container knows about its children while nothing has changed behind it, so
   // that a block added below all of them costs O(1): the text is extended instead of
-  // rebuilt and the children are not rescanned. Defined in RVRecognitionBlockAssembly.cpp.
+  // rebuilt and the children are not rescanned. Defined in ocr/AssemblyCache.h.
   struct AssemblyCache;
 
   bool containsChild(const std::shared_ptr<RVRecognitionBlock>& block) const;

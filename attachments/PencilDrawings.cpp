@@ -28,22 +28,28 @@ void setSavingInRange(const AttributedString& text, Range range, std::int64_t sa
       });
 }
 
-}  // namespace
-
-void AttributedString::insertImage(const std::shared_ptr<Image>& image,
-                                   const std::optional<Data>& pencilData, Range range) {
-  // Checked first so that a refused edit leaves no stray files behind.
-  if (!inBounds(range)) return;
-  beginEditing();
-  auto drawing = RVPencilAttachment::initWithData(pencilData, RVPencilAttachmentFileType);
-  auto picture = RVMXScaledImageAttachment::initWithImage(image, drawing);
-  replaceCharactersInRange(range, attributedStringWithAttachment(picture));
-  endEditing();
+bool inBounds(const AttributedString& text, Range range) {
+  return range.location <= text.length() && range.length <= text.length() - range.location;
 }
 
-PencilDataDictionary AttributedString::pencilDataDictionaryForRange(Range range) const {
+}  // namespace
+
+namespace PencilDrawings {
+
+void insertImage(AttributedString& text, const std::shared_ptr<Image>& image,
+                 const std::optional<Data>& pencilData, Range range) {
+  // Checked first so that a refused edit leaves no stray files behind.
+  if (!inBounds(text, range)) return;
+  text.beginEditing();
+  auto drawing = RVPencilAttachment::initWithData(pencilData, RVPencilAttachmentFileType);
+  auto picture = RVMXScaledImageAttachment::initWithImage(image, drawing);
+  text.replaceCharactersInRange(range, AttributedString::attributedStringWithAttachment(picture));
+  text.endEditing();
+}
+
+PencilDataDictionary pencilDataDictionaryForRange(const AttributedString& text, Range range) {
   PencilDataDictionary dictionary;
-  enumerateAttributesInRange(
+  text.enumerateAttributesInRange(
       range, AttributedStringEnumerationLongestEffectiveRangeNotRequired,
       [&](const Attributes& attributes, Range, bool*) {
         for (const auto& [name, value] : attributes) {
@@ -56,7 +62,7 @@ PencilDataDictionary AttributedString::pencilDataDictionaryForRange(Range range)
           auto strokes = picture->pencilAttachment()->strokeData();
           auto wrapper = picture->fileWrapper();
           if (!wrapper || !wrapper->filename()) continue;
-          std::string identifier = pencil::identifierOfFileName(*wrapper->filename());
+          std::string identifier = detail::identifierOfFileName(*wrapper->filename());
           if (strokes)
             dictionary[identifier] = std::move(*strokes);
           else
@@ -66,21 +72,21 @@ PencilDataDictionary AttributedString::pencilDataDictionaryForRange(Range range)
   return dictionary;
 }
 
-void AttributedString::preCutOrCopy(Range range) const {
-  setSavingInRange(*this, range, kSavingWritingOut);
-  pencilDataDict = pencilDataDictionaryForRange(range);
+void preCutOrCopy(const AttributedString& text, Range range) {
+  setSavingInRange(text, range, kSavingWritingOut);
+  pencilDataDict = pencilDataDictionaryForRange(text, range);
 }
 
-void AttributedString::postCutOrCopy(Range range) const {
-  addPencilDataToClipboard(pencilDataDict);
+void postCutOrCopy(const AttributedString& text, Range range) {
+  addPencilDataToClipboard(text, pencilDataDict);
   // After a cut the range may now run past the end; the cut attachments then keep
   // `saving` 1. A clamped range would reset attachments that were never cut.
-  if (inBounds(range)) setSavingInRange(*this, range, kSavingEditing);
+  if (inBounds(text, range)) setSavingInRange(text, range, kSavingEditing);
   pencilDataDict.reset();
 }
 
-void AttributedString::addPencilDataToClipboard(
-    const std::optional<PencilDataDictionary>& pencilData) const {
+void addPencilDataToClipboard(const AttributedString& /*text*/,
+                              const std::optional<PencilDataDictionary>& pencilData) {
   if (!pencilData || pencilData->empty()) return;
   std::string error;
   auto archive = KeyedArchive::archiveDictionary(*pencilData, &error);
@@ -92,10 +98,11 @@ void AttributedString::addPencilDataToClipboard(
   Pasteboard::general()->setData(*archive, RVPencilPasteboardData);
 }
 
-void AttributedString::checkForPencilDataOnPaste() const {
+void checkForPencilDataOnPaste(const AttributedString& /*text*/) {
   auto item = Pasteboard::general()->dataForType(RVPencilPasteboardData);
   if (!item) return;
   pastedPencilDataDictionary = KeyedArchive::unarchiveDictionary(*item);
 }
 
+}  // namespace PencilDrawings
 }  // namespace corvel

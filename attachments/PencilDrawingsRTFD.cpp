@@ -15,76 +15,81 @@ std::shared_ptr<TextAttachment> attachmentIn(const AttributeValue* value) {
 }
 
 bool isDrawingFile(const FileWrapper& wrapper) {
-  return pencil::hasPencilDataExtension(wrapper.preferredFilename()) ||
-         pencil::hasPencilDataExtension(wrapper.filename());
+  return detail::hasPencilDataExtension(wrapper.preferredFilename()) ||
+         detail::hasPencilDataExtension(wrapper.filename());
 }
 
 }  // namespace
 
-std::optional<std::string> AttributedString::identifierForAttachment(
-    const std::shared_ptr<TextAttachment>& attachment) const {
+namespace PencilDrawings {
+
+std::optional<std::string> identifierForAttachment(
+    const AttributedString& /*text*/, const std::shared_ptr<TextAttachment>& attachment) {
   auto wrapper = attachment ? attachment->fileWrapper() : nullptr;
   if (!wrapper) return std::nullopt;
   const auto& name =
       wrapper->preferredFilename() ? wrapper->preferredFilename() : wrapper->filename();
   if (!name) return std::nullopt;
-  return pencil::identifierOfFileName(*name);
+  return detail::identifierOfFileName(*name);
 }
 
-std::optional<std::string> AttributedString::fileIDForAttachment(
-    const std::shared_ptr<TextAttachment>& attachment) const {
+std::optional<std::string> fileIDForAttachment(const AttributedString& /*text*/,
+                                               const std::shared_ptr<TextAttachment>& attachment) {
   auto wrapper = attachment ? attachment->fileWrapper() : nullptr;
   if (!wrapper || !wrapper->filename()) return std::nullopt;
-  return pencil::identifierOfFileName(*wrapper->filename());
+  return detail::identifierOfFileName(*wrapper->filename());
 }
 
-PencilAttachmentDictionary AttributedString::removePencilAttachments() {
+PencilAttachmentDictionary removePencilAttachments(AttributedString& text) {
   PencilAttachmentDictionary drawings;
   std::vector<Range> ranges;
-  enumerateAttribute(AttachmentAttributeName, Range{0, length()}, 0,
-                     [&](const AttributeValue* value, Range range, bool*) {
-                       auto attachment = attachmentIn(value);
-                       auto wrapper = attachment ? attachment->fileWrapper() : nullptr;
-                       if (!wrapper || !isDrawingFile(*wrapper)) return;
-                       if (auto identifier = identifierForAttachment(attachment))
-                         drawings[*identifier] = attachment;
-                       ranges.push_back(range);
-                     });
+  text.enumerateAttribute(AttachmentAttributeName, Range{0, text.length()}, 0,
+                          [&](const AttributeValue* value, Range range, bool*) {
+                            auto attachment = attachmentIn(value);
+                            auto wrapper = attachment ? attachment->fileWrapper() : nullptr;
+                            if (!wrapper || !isDrawingFile(*wrapper)) return;
+                            if (auto identifier = identifierForAttachment(text, attachment))
+                              drawings[*identifier] = attachment;
+                            ranges.push_back(range);
+                          });
   // Only the attribute goes: the characters stay, so ranges the host holds keep their
   // meaning and the text keeps its length.
   for (auto it = ranges.rbegin(); it != ranges.rend(); ++it)
-    removeAttribute(AttachmentAttributeName, *it);
+    text.removeAttribute(AttachmentAttributeName, *it);
   return drawings;
 }
 
-void AttributedString::appendPencilAttachments(
-    const std::optional<PencilAttachmentDictionary>& pencilAttachments) {
+void appendPencilAttachments(AttributedString& text,
+                             const std::optional<PencilAttachmentDictionary>& pencilAttachments) {
   if (!pencilAttachments) return;
   std::vector<std::shared_ptr<TextAttachment>> noted;
-  enumerateAttribute(AttachmentAttributeName, Range{0, length()}, 0,
-                     [&](const AttributeValue* value, Range, bool*) {
-                       auto attachment = attachmentIn(value);
-                       auto wrapper = attachment ? attachment->fileWrapper() : nullptr;
-                       if (!wrapper || (!wrapper->preferredFilename() && !wrapper->filename()))
-                         return;
-                       auto identifier = identifierForAttachment(attachment);
-                       if (!identifier) return;
-                       auto found = pencilAttachments->find(*identifier);
-                       if (found != pencilAttachments->end() && found->second)
-                         noted.push_back(found->second);
-                     });
-  for (const auto& drawing : noted) appendAttributedString(attributedStringWithAttachment(drawing));
+  text.enumerateAttribute(AttachmentAttributeName, Range{0, text.length()}, 0,
+                          [&](const AttributeValue* value, Range, bool*) {
+                            auto attachment = attachmentIn(value);
+                            auto wrapper = attachment ? attachment->fileWrapper() : nullptr;
+                            if (!wrapper || (!wrapper->preferredFilename() && !wrapper->filename()))
+                              return;
+                            auto identifier = identifierForAttachment(text, attachment);
+                            if (!identifier) return;
+                            auto found = pencilAttachments->find(*identifier);
+                            if (found != pencilAttachments->end() && found->second)
+                              noted.push_back(found->second);
+                          });
+  for (const auto& drawing : noted)
+    text.appendAttributedString(AttributedString::attributedStringWithAttachment(drawing));
 }
 
-void AttributedString::preSaveRTFD(Range* range) { preSaveRTFD(range, std::nullopt); }
+void preSaveRTFD(AttributedString& text, Range* range) { preSaveRTFD(text, range, std::nullopt); }
 
-void AttributedString::preSaveRTFD(
-    Range*, const std::optional<PencilAttachmentDictionary>& pencilAttachments) {
-  if (pencilAttachments && !pencilAttachments->empty()) appendPencilAttachments(pencilAttachments);
+void preSaveRTFD(AttributedString& text, Range*,
+                 const std::optional<PencilAttachmentDictionary>& pencilAttachments) {
+  if (pencilAttachments && !pencilAttachments->empty())
+    appendPencilAttachments(text, pencilAttachments);
 }
 
-void AttributedString::postSaveRTFD(Range) { removePencilAttachments(); }
+void postSaveRTFD(AttributedString& text, Range) { removePencilAttachments(text); }
 
-void AttributedString::postLoadDocument() {}
+void postLoadDocument(AttributedString&) {}
 
+}  // namespace PencilDrawings
 }  // namespace corvel

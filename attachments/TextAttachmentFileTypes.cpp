@@ -3,6 +3,8 @@
 #include <cctype>
 
 #include "Corvelbase/RVMXTextAttachment.h"
+#include "Corvelbase/RVPencilAttachment.h"
+#include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TypeRegistry.h"
 
@@ -14,17 +16,6 @@ constexpr char kImageType[] = "public.image";
 constexpr char kMovieType[] = "public.movie";
 constexpr char kPDFType[] = "com.adobe.pdf";
 constexpr char kAudioType[] = "public.audio";
-constexpr char kPencilDataExtension[] = "pencildata";
-
-// The path extension as the platform takes it: what follows the last '.' of the last
-// path component, when that dot is not its first character.
-std::string pathExtension(const std::string& path) {
-  std::string name =
-      path.substr(path.find_last_of('/') == std::string::npos ? 0 : path.find_last_of('/') + 1);
-  auto dot = name.rfind('.');
-  if (dot == std::string::npos || dot == 0) return {};
-  return name.substr(dot + 1);
-}
 
 }  // namespace
 
@@ -74,7 +65,7 @@ bool TextAttachment::isPencilData() const {
   std::string extension = pathExtension(*wrapper->filename());
   std::transform(extension.begin(), extension.end(), extension.begin(),
                  [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
-  return extension == kPencilDataExtension;
+  return extension == RVPencilDataExtension;
 }
 
 }  // namespace corvel

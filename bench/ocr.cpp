@@ -37,7 +37,8 @@
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
-#include "TesseractCommand.h"
+#include "bench/TesseractCommand.h"
+#include "platform/tesseract/TesseractStatistics.h"
 #include "support/TextDistance.h"
 
 namespace {
@@ -117,7 +118,7 @@ Run runOurs(const std::vector<Sample>& samples, bool fast, TesseractRecognizer& 
   Run run;
   run.texts.resize(samples.size());
   std::vector<char> done(samples.size(), 0);
-  auto before = recognizer.statistics();
+  auto before = detail::tesseractStatistics(recognizer);
   double cpuBefore = processCpuSeconds();
   auto start = std::chrono::steady_clock::now();
   for (std::size_t i = 0; i < samples.size(); ++i) {
@@ -132,7 +133,7 @@ Run runOurs(const std::vector<Sample>& samples, bool fast, TesseractRecognizer& 
       [&] { return std::all_of(done.begin(), done.end(), [](char d) { return d; }); });
   run.seconds = since(start);
   double cpu = processCpuSeconds() - cpuBefore;
-  auto after = recognizer.statistics();
+  auto after = detail::tesseractStatistics(recognizer);
   double engine = after.recognitionCpuSeconds - before.recognitionCpuSeconds;
   run.startupSeconds = after.engineStartCpuSeconds - before.engineStartCpuSeconds;
   double ours = cpu - engine - run.startupSeconds;

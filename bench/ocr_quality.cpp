@@ -34,7 +34,7 @@
 #include "Corvelbase/platform/OperationQueue.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
-#include "TesseractCommand.h"
+#include "bench/TesseractCommand.h"
 #include "support/WordScore.h"
 
 namespace {

@@ -18,7 +18,7 @@ constexpr char16_t kClosingDiv[] = u"</div>\n";
 }  // namespace
 
 String insertInlineCodeBlock(const String& text, Range range) {
-  const Range selection = internal::clampToText(text, range);
+  const Range selection = detail::clampToText(text, range);
   if (selection.length == 0) return u"``";
   String code(u"`");
   code.append(text, static_cast<std::size_t>(selection.location),
@@ -28,14 +28,14 @@ String insertInlineCodeBlock(const String& text, Range range) {
 }
 
 std::optional<String> insertCodeBlock(const String& text, Range range, Range* replacementRange) {
-  const Range selection = internal::clampToText(text, range);
+  const Range selection = detail::clampToText(text, range);
   std::vector<LineItem> items = linesForRange(text, selection);
   if (items.empty()) return std::nullopt;
   // The fence must start a line of its own.
   String lead = selection.location == rangeForItem(text, &items.front()).location ? u"" : u"\n";
   // The body's own final line feed, if any, is followed by another: an empty line before
   // the closing fence, kept so that the block reads the same however it was selected.
-  String block = lead + kFence + internal::substring(text, selection) + u"\n" + kFence;
+  String block = lead + kFence + detail::substring(text, selection) + u"\n" + kFence;
   if (replacementRange) *replacementRange = selection;
   return block;
 }
@@ -66,7 +66,7 @@ String justifyString(const String&, std::int64_t alignment) {
 
 String insertHTMLJustity(const String& text, std::int64_t alignment, Range range,
                          Range* replacementRange) {
-  const Range selection = internal::clampToText(text, range);
+  const Range selection = detail::clampToText(text, range);
   String output = justifyString(text, alignment);
   std::vector<LineItem> items = linesForRange(text, selection);
   if (items.empty()) {

@@ -33,7 +33,7 @@ LineItem itemFor(std::u16string_view text, std::size_t start, std::size_t end) {
 }  // namespace
 
 std::vector<LineItem> linesForRange(const String& text, Range range) {
-  const Range selection = internal::clampToText(text, range);
+  const Range selection = detail::clampToText(text, range);
   const std::u16string_view view(text);
   const std::size_t size = view.size();
   const auto location = static_cast<std::size_t>(selection.location);

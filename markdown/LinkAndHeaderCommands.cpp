@@ -28,7 +28,7 @@ std::size_t leadingHashes(const String& line) {
 }  // namespace
 
 bool lineContainsMarkdownLink(const String& text, Range range, Range* linkRange, Range* textRange) {
-  const Range selection = internal::clampToText(text, range);
+  const Range selection = detail::clampToText(text, range);
   Range link = NotFoundRange;
   std::vector<LineItem> items = linesForRange(text, selection);
   if (items.empty()) {
@@ -63,7 +63,7 @@ bool lineContainsMarkdownLink(const String& text, Range range, Range* linkRange,
 }
 
 String insertMarkdownLink(const String& text, const String& url, Range range) {
-  return u"[" + internal::substring(text, internal::clampToText(text, range)) + u"](" + url + u")";
+  return u"[" + detail::substring(text, detail::clampToText(text, range)) + u"](" + url + u")";
 }
 
 String headerForLevel(const String&, std::uint64_t level) {

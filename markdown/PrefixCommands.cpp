@@ -51,10 +51,10 @@ String numbered(std::size_t number, const String& rest) {
 
 String insertAtStartOfLine(const String& text, const String& prefix, Range range,
                            bool firstLineOnly, Range* replacementRange, Range* selectionRange) {
-  const Range selection = internal::clampToText(text, range);
+  const Range selection = detail::clampToText(text, range);
   std::vector<LineItem> items = linesForRange(text, selection);
   const std::uint64_t first = items.empty() ? selection.location : items.front().range.location;
-  internal::SelectionTracker tracker(selection, first);
+  detail::SelectionTracker tracker(selection, first);
   Range replaced{first, 0};
   String output;
 
@@ -117,10 +117,10 @@ bool containsNumberedList(const String& line, Range* range) {
 
 String insertNumberedList(const String& text, Range range, Range* replacementRange,
                           Range* selectionRange) {
-  const Range selection = internal::clampToText(text, range);
+  const Range selection = detail::clampToText(text, range);
   std::vector<LineItem> items = linesForRange(text, selection);
   const std::uint64_t first = items.empty() ? selection.location : items.front().range.location;
-  internal::SelectionTracker tracker(selection, first);
+  detail::SelectionTracker tracker(selection, first);
   Range replaced{first, 0};
   String output;
   bool removing = false;

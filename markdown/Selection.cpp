@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-namespace corvel::MarkdownCommands::internal {
+namespace corvel::detail {
 
 Range clampToText(const String& text, Range range) {
   std::uint64_t size = text.size();
@@ -49,4 +49,4 @@ Range SelectionTracker::selection() const {
   return Range{static_cast<std::uint64_t>(start_), static_cast<std::uint64_t>(carriedLength_)};
 }
 
-}  // namespace corvel::MarkdownCommands::internal
+}  // namespace corvel::detail

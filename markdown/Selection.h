@@ -6,7 +6,7 @@
 
 #include "Corvelbase/platform/String.h"
 
-namespace corvel::MarkdownCommands::internal {
+namespace corvel::detail {
 
 // `range` cut to the text: the location at most the text's length, the length at most
 // what remains after the location. Never overflows.
@@ -39,4 +39,4 @@ class SelectionTracker {
   std::int64_t carriedLength_;
 };
 
-}  // namespace corvel::MarkdownCommands::internal
+}  // namespace corvel::detail

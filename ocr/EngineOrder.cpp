@@ -4,7 +4,7 @@
 #include <memory>
 #include <numeric>
 
-namespace corvel::ocr_internal {
+namespace corvel::detail {
 
 namespace {
 
@@ -248,4 +248,4 @@ String engineOrderText(const RVBlockArray& columns) {
   return text;
 }
 
-}  // namespace corvel::ocr_internal
+}  // namespace corvel::detail

@@ -8,7 +8,7 @@
 #include "Corvelbase/platform/String.h"
 #include "Corvelbase/platform/TextRecognizer.h"
 
-namespace corvel::ocr_internal {
+namespace corvel::detail {
 
 // One column-level block per engine block, holding a paragraph-level block per engine
 // paragraph, holding the line-level blocks (best reading, confidence in percent). A
@@ -26,4 +26,4 @@ RVBlockArray rowsOrderColumns(const std::vector<RecognizedTextObservation>& obse
 // The page's text: lines joined by "\n", paragraphs (and blocks) by "\n\n".
 String engineOrderText(const RVBlockArray& columns);
 
-}  // namespace corvel::ocr_internal
+}  // namespace corvel::detail

@@ -4,7 +4,7 @@
 #include "Corvelbase/platform/Platform.h"
 #include "ocr/EngineOrder.h"
 
-namespace corvel::ocr_internal {
+namespace corvel::detail {
 
 namespace {
 constexpr const char* kDefaultLanguage = "en-US";
@@ -53,4 +53,4 @@ String orderedText(RVReadingOrder order, const std::vector<RecognizedTextObserva
   return text;
 }
 
-}  // namespace corvel::ocr_internal
+}  // namespace corvel::detail

@@ -9,7 +9,7 @@
 #include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/TextRecognizer.h"
 
-namespace corvel::ocr_internal {
+namespace corvel::detail {
 
 // Revision by platform version, language correction on, the level from the speed
 // choice, `timeout`, and the languages: `orderedCodes` (already ordered), or with none
@@ -23,4 +23,4 @@ void configureRequest(TextRecognitionRequest& request, const std::vector<std::st
 String orderedText(RVReadingOrder order, const std::vector<RecognizedTextObservation>& observations,
                    Size size, RVTextLayoutAnalyser& analyser);
 
-}  // namespace corvel::ocr_internal
+}  // namespace corvel::detail

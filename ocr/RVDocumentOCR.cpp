@@ -124,7 +124,7 @@ void RVDocumentOCR::runPage(const std::shared_ptr<JobState>& state, std::size_t 
           Size{static_cast<double>(bitmap->width()), static_cast<double>(bitmap->height())};
       page.resolution = resolution;
       auto request = TextRecognitionRequest::init();
-      ocr_internal::configureRequest(*request, state->languageCodes, state->fast, timeout_);
+      detail::configureRequest(*request, state->languageCodes, state->fast, timeout_);
       request->setCancellationCheck([state] { return state->cancelled.load(); });
       auto handler = ImageRequestHandler::initWithCGImage(std::move(bitmap), {});
       if (!handler->performRequests({request}, &error)) {
@@ -133,7 +133,7 @@ void RVDocumentOCR::runPage(const std::shared_ptr<JobState>& state, std::size_t 
         page.observations = request->results().value_or(std::vector<RecognizedTextObservation>());
         auto analyser = RVTextLayoutAnalyser::init();
         page.text =
-            ocr_internal::orderedText(readingOrder_, page.observations, page.pixelSize, *analyser);
+            detail::orderedText(readingOrder_, page.observations, page.pixelSize, *analyser);
         page.layoutBlocks = analyser->layoutBlocks();
       }
     }

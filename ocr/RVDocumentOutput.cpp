@@ -6,6 +6,8 @@
 #include <cstdio>
 #include <nlohmann/json.hpp>
 
+#include "Corvelbase/platform/Files.h"
+
 namespace corvel {
 
 namespace {
@@ -420,9 +422,8 @@ std::optional<RVDocumentFormat> documentFormatNamed(const std::string& name) {
 std::string documentFormatNames() { return "txt, json, hocr, alto, tsv, pdf"; }
 
 std::optional<RVDocumentFormat> documentFormatForPath(const std::string& path) {
-  std::size_t dot = path.rfind('.');
-  if (dot == std::string::npos || path.find('/', dot) != std::string::npos) return std::nullopt;
-  std::string extension = path.substr(dot + 1);
+  std::string extension = pathExtension(path);
+  if (extension.empty()) return std::nullopt;
   std::transform(extension.begin(), extension.end(), extension.begin(),
                  [](unsigned char c) { return static_cast<char>(std::tolower(c)); });
   if (extension == "text") return RVDocumentFormat::Text;

@@ -1,14 +1,17 @@
 // The block record: initialisers, geometry of the record, equality and the dictionary form.
 #include "Corvelbase/RVRecognitionBlock.h"
 
+#include <cxxabi.h>
+
 #include <cfloat>
 #include <cmath>
 #include <cstdio>
+#include <typeinfo>
 #include <utility>
 #include <vector>
 
-#include "AssemblyCache.h"
 #include "Corvelbase/platform/Files.h"
+#include "ocr/AssemblyCache.h"
 
 namespace corvel {
 
@@ -28,6 +31,20 @@ const char* const kRVBlockChildBlocksKey = "childBlocks";
 namespace {
 
 constexpr std::size_t kChildCapacity = 10;
+
+// Whether the class `derived` is `base` or derives from it. Read from the C++ runtime's
+// own class descriptions (the Itanium ABI of every Linux compiler), so that a host's
+// subclass of a block needs to declare nothing for equality to see its class.
+bool isSameOrDerived(const std::type_info& derived, const std::type_info& base) {
+  if (derived == base) return true;
+  if (auto* single = dynamic_cast<const abi::__si_class_type_info*>(&derived))
+    return isSameOrDerived(*single->__base_type, base);
+  if (auto* multiple = dynamic_cast<const abi::__vmi_class_type_info*>(&derived)) {
+    for (unsigned i = 0; i < multiple->__base_count; ++i)
+      if (isSameOrDerived(*multiple->__base_info[i].__base_type, base)) return true;
+  }
+  return false;
+}
 
 std::shared_ptr<RVBlockArray> newChildArray() {
   auto array = std::make_shared<RVBlockArray>();
@@ -165,6 +182,9 @@ bool RVRecognitionBlock::isEqual(const std::shared_ptr<RVRecognitionBlock>& othe
 bool RVRecognitionBlock::isEqual(const RVRecognitionBlock* other) const {
   if (other == this) return true;
   if (!other) return false;
+  // `other` of this block's class or a subclass: a plain block may equal an instance of a
+  // host's subclass, but that instance never equals a plain block.
+  if (!isSameOrDerived(typeid(*other), typeid(*this))) return false;
   if (hash() != other->hash()) return false;
   if (level_ != other->level_) return false;
   if (!(std::fabs(confidence_ - other->confidence_) < static_cast<double>(FLT_EPSILON)))

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cmath>
 
-#include "AssemblyCache.h"
+#include "ocr/AssemblyCache.h"
 
 #include "Corvelbase/RVRecognitionBlock.h"
 #include "Corvelbase/platform/CJK.h"

@@ -162,7 +162,7 @@ void RVVisionOCR::runJob(const std::shared_ptr<JobState>& state, const LanguageC
       [self, state](TextRecognitionRequest& finished, const std::optional<Error>& error) {
         String text;
         if (!error && self->readingOrder_ != RVReadingOrderLayoutAnalysis) {
-          text = ocr_internal::orderedText(
+          text = detail::orderedText(
               self->readingOrder_,
               finished.results().value_or(std::vector<RecognizedTextObservation>()), Size{},
               *self->layoutAnalyser_);
@@ -177,7 +177,7 @@ void RVVisionOCR::runJob(const std::shared_ptr<JobState>& state, const LanguageC
           if (self->completion_) self->completion_(text, error);
         });
       });
-  ocr_internal::configureRequest(
+  detail::configureRequest(
       *request, languageCodes.empty() ? languageCodes : orderLanguageCodes(languageCodes),
       useFastTextRecognition, timeout_);
   request->setCancellationCheck([state] { return state->stopped.load(std::memory_order_relaxed); });

@@ -42,7 +42,7 @@ class ImageDocument final : public Document {
       *error = makeDocumentError(DocumentErrorUnreadable, image->failureReason());
       return nullptr;
     }
-    if (resolution) *resolution = document_backend::bitmapResolution(*bitmap);
+    if (resolution) *resolution = detail::bitmapResolution(*bitmap);
     return bitmap;
   }
 };
@@ -63,19 +63,19 @@ std::shared_ptr<Document> Document::initWithFile(const std::string& path, Error*
   std::size_t size = std::fread(head, 1, sizeof head, file);
   std::fclose(file);
   std::string_view start(head, size);
-  if (start.find("%PDF-") != std::string_view::npos) return document_backend::openPdf(path, out);
+  if (start.find("%PDF-") != std::string_view::npos) return detail::openPdf(path, out);
   if (start.starts_with(std::string_view("II*\0", 4)) ||
       start.starts_with(std::string_view("MM\0*", 4))) {
-    return document_backend::openTiff(path, out);
+    return detail::openTiff(path, out);
   }
   // Only the header is read now, to tell a picture from anything else.
-  if (!document_backend::probeImage(path, out)) return nullptr;
+  if (!detail::probeImage(path, out)) return nullptr;
   return std::shared_ptr<Document>(new ImageDocument(path));
 }
 
 bool writeSearchablePdf(const Document& document, const std::vector<TextLayerPage>& pages,
                         const std::string& path, Error* error) {
-  return document_backend::writeSearchablePdf(document, pages, path, error);
+  return detail::writeSearchablePdf(document, pages, path, error);
 }
 
 }  // namespace corvel

@@ -6,7 +6,7 @@
 
 #include "Corvelbase/platform/Document.h"
 
-namespace corvel::document_backend {
+namespace corvel::detail {
 
 // Each opens `path`, already known to start like its kind; nullptr with *error (never
 // null) when it cannot.
@@ -23,4 +23,4 @@ double bitmapResolution(const Bitmap& bitmap);
 bool writeSearchablePdf(const Document& document, const std::vector<TextLayerPage>& pages,
                         const std::string& path, Error* error);
 
-}  // namespace corvel::document_backend
+}  // namespace corvel::detail

@@ -11,6 +11,7 @@
 #include <new>
 
 #include "Corvelbase/platform/Files.h"
+#include "platform/SiblingFiles.h"
 
 namespace corvel {
 
@@ -33,17 +34,10 @@ bool isMetadataName(std::string_view name) {
   return name == "." || name == "__@PreferredName@__" || name == "__@UTF8PreferredName@__";
 }
 
-std::string lastComponent(const std::string& path) {
-  std::string p = path;
-  while (p.size() > 1 && p.back() == '/') p.pop_back();
-  auto slash = p.rfind('/');
-  return slash == std::string::npos ? p : p.substr(slash + 1);
-}
-
 std::shared_ptr<FileWrapper> readPath(const std::string& path, int depth) {
   struct stat st;
   if (depth > kMaxDepth || lstat(path.c_str(), &st) != 0) return nullptr;
-  std::string name = lastComponent(path);
+  std::string name = lastPathComponent(path);
   if (S_ISREG(st.st_mode)) {
     auto bytes = readFile(path);
     if (!bytes) return nullptr;
@@ -260,9 +254,8 @@ std::string FileWrapper::addFileWrapper(std::shared_ptr<FileWrapper> child,
                                         const std::string& name) {
   if (!isDirectory() || !child || !isSafeFileName(name)) return {};
   std::string unique = name;
-  auto dot = name.rfind('.');
-  std::string stem = dot == std::string::npos || dot == 0 ? name : name.substr(0, dot);
-  std::string extension = stem.size() == name.size() ? "" : name.substr(dot);
+  std::string stem = deletingPathExtension(name);
+  std::string extension = name.substr(stem.size());  // with its dot
   // Probing resumes where the last child asking for this name stopped, so adding many
   // children under one name stays linear.
   int& n = nextSuffix_[name];
@@ -288,9 +281,7 @@ bool FileWrapper::writeToPath(const std::string& path) const {
   std::string staging;
   bool made = false;
   for (int attempt = 0; !made && attempt < 16; ++attempt) {
-    staging = (parent / ("." + target.filename().string() + "." + makeUUIDString().substr(0, 8) +
-                         std::to_string(attempt)))
-                  .string();
+    staging = detail::uniqueSibling(target.string(), attempt);
     made = mkdir(staging.c_str(), 0777) == 0;
     if (!made && errno != EEXIST) return false;
   }

@@ -11,8 +11,46 @@
 #include <fstream>
 
 #include "Corvelbase/platform/Platform.h"
+#include "platform/SiblingFiles.h"
 
 namespace corvel {
+
+namespace {
+
+// The path without its trailing slashes; "/" when it is nothing but slashes.
+std::string_view withoutTrailingSlashes(std::string_view path) {
+  auto end = path.find_last_not_of('/');
+  if (end == std::string_view::npos) return path.empty() ? path : path.substr(0, 1);
+  return path.substr(0, end + 1);
+}
+
+// Where the extension's dot stands in `path` (already without trailing slashes), or npos.
+std::size_t extensionDot(std::string_view path) {
+  auto slash = path.rfind('/');
+  std::size_t start = slash == std::string_view::npos ? 0 : slash + 1;
+  auto dot = path.rfind('.');
+  return dot == std::string_view::npos || dot <= start ? std::string_view::npos : dot;
+}
+
+}  // namespace
+
+std::string lastPathComponent(std::string_view path) {
+  path = withoutTrailingSlashes(path);
+  if (path == "/") return std::string(path);
+  auto slash = path.rfind('/');
+  return std::string(slash == std::string_view::npos ? path : path.substr(slash + 1));
+}
+
+std::string pathExtension(std::string_view path) {
+  path = withoutTrailingSlashes(path);
+  auto dot = extensionDot(path);
+  return dot == std::string_view::npos ? std::string() : std::string(path.substr(dot + 1));
+}
+
+std::string deletingPathExtension(std::string_view path) {
+  path = withoutTrailingSlashes(path);
+  return std::string(path.substr(0, extensionDot(path)));
+}
 
 std::optional<Data> readFile(const std::string& path) {
   std::error_code ec;
@@ -32,6 +70,8 @@ bool syncDirectory(const std::string& path) {
   return ok;
 }
 
+namespace detail {
+
 std::string uniqueSibling(const std::string& path, int attempt) {
   std::filesystem::path target(path);
   // Appended piece by piece: GCC 12 at -O3 misreads "." + string + "..." (-Wrestrict).
@@ -41,17 +81,32 @@ std::string uniqueSibling(const std::string& path, int attempt) {
   return (target.parent_path() / name).string();
 }
 
-bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes, std::size_t size) {
-  // The temporary file is created with 0666 so that open applies the process's umask
-  // (and a directory's default ACL), as an ordinary write would: asking umask for the
-  // mask would change it for every thread in between.
-  std::string temporary;
-  int fd = -1;
-  for (int attempt = 0; fd < 0 && attempt < 16; ++attempt) {
-    temporary = uniqueSibling(path, attempt);
-    fd = ::open(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
-    if (fd < 0 && errno != EEXIST) return false;
+int createSiblingFile(const std::string& path, std::string* temporary) {
+  // Created with 0666 so that open applies the process's umask (and a directory's default
+  // ACL), as an ordinary write would: asking umask for the mask would change it for every
+  // thread in between.
+  for (int attempt = 0; attempt < 16; ++attempt) {
+    *temporary = uniqueSibling(path, attempt);
+    int fd = ::open(temporary->c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
+    if (fd >= 0 || errno != EEXIST) return fd;
   }
+  return -1;
+}
+
+bool replaceWithSibling(const std::string& temporary, const std::string& path) {
+  if (std::rename(temporary.c_str(), path.c_str()) != 0) {
+    ::unlink(temporary.c_str());
+    return false;
+  }
+  // The new name lives in the directory: without this it may be gone after a power cut.
+  return syncDirectory(std::filesystem::path(path).parent_path().string());
+}
+
+}  // namespace detail
+
+bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes, std::size_t size) {
+  std::string temporary;
+  int fd = detail::createSiblingFile(path, &temporary);
   if (fd < 0) return false;
   bool ok = true;
   std::size_t written = 0;
@@ -65,10 +120,11 @@ bool writeFileAtomically(const std::string& path, const std::uint8_t* bytes, std
   }
   if (ok) ok = fsync(fd) == 0;
   if (::close(fd) != 0) ok = false;
-  if (ok) ok = std::rename(temporary.c_str(), path.c_str()) == 0;
-  if (!ok) ::unlink(temporary.c_str());
-  // The new name lives in the directory: without this it may be gone after a power cut.
-  return ok && syncDirectory(std::filesystem::path(path).parent_path().string());
+  if (!ok) {
+    ::unlink(temporary.c_str());
+    return false;
+  }
+  return detail::replaceWithSibling(temporary, path);
 }
 
 std::string cachesDirectory() {

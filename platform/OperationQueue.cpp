@@ -1,8 +1,11 @@
 #include "Corvelbase/platform/OperationQueue.h"
 
 #include <algorithm>
+#include <deque>
+#include <thread>
 
 #include "Corvelbase/platform/Platform.h"
+#include "platform/Backends.h"
 
 namespace corvel {
 
@@ -76,46 +79,97 @@ void BlockOperation::main() {
 
 // --- OperationQueue -----------------------------------------------------------------
 
+// The workers and what they share; every field is guarded by `mutex`.
+struct OperationQueue::Workers {
+  std::mutex mutex;
+  std::condition_variable changed;
+  std::deque<std::shared_ptr<Operation>> waiting;
+  std::vector<std::shared_ptr<Operation>> running;
+  std::vector<std::thread> threads;
+  std::size_t idle = 0;
+  std::int64_t maxConcurrent = -1;
+  bool stopping = false;
+
+  // With `mutex` held: one worker per operation that may run now; workers stay for later
+  // operations.
+  void startIfNeeded() {
+    std::size_t limit = maxConcurrent < 1 ? waiting.size() + running.size()
+                                          : static_cast<std::size_t>(maxConcurrent);
+    std::size_t wanted = std::min(limit, waiting.size() + running.size());
+    while (threads.size() < wanted && idle < waiting.size()) {
+      threads.emplace_back([this] { loop(); });
+      ++idle;
+    }
+  }
+
+  void loop() {
+    std::unique_lock lock(mutex);
+    for (;;) {
+      changed.wait(lock, [this] {
+        bool room = maxConcurrent < 1 || running.size() < static_cast<std::size_t>(maxConcurrent);
+        return stopping || (room && !waiting.empty());
+      });
+      if (stopping) return;
+      std::shared_ptr<Operation> operation = std::move(waiting.front());
+      waiting.pop_front();
+      running.push_back(operation);
+      --idle;
+      lock.unlock();
+      operation->start();
+      lock.lock();
+      running.erase(std::find(running.begin(), running.end(), operation));
+      ++idle;
+      lock.unlock();
+      operation.reset();  // release what the work captured outside the queue's lock
+      lock.lock();
+      changed.notify_all();
+    }
+  }
+};
+
+OperationQueue::OperationQueue() : workers_(std::make_unique<Workers>()) {}
+
 std::shared_ptr<OperationQueue> OperationQueue::init() {
   return std::shared_ptr<OperationQueue>(new OperationQueue);
 }
 
 OperationQueue::~OperationQueue() {
-  std::vector<std::thread> workers;
+  std::vector<std::thread> threads;
   std::deque<std::shared_ptr<Operation>> dropped;
   {
-    std::lock_guard lock(mutex_);
-    stopping_ = true;
-    dropped.swap(waiting_);
-    workers.swap(workers_);
+    std::lock_guard lock(workers_->mutex);
+    workers_->stopping = true;
+    dropped.swap(workers_->waiting);
+    threads.swap(workers_->threads);
   }
-  changed_.notify_all();
+  workers_->changed.notify_all();
   for (auto& operation : dropped) operation->finishUnrun();
-  for (auto& worker : workers) worker.join();
+  for (auto& thread : threads) thread.join();
 }
 
 void OperationQueue::setMaxConcurrentOperationCount(std::int64_t count) {
-  std::lock_guard lock(mutex_);
-  maxConcurrent_ = count;
-  startWorkersIfNeeded();
-  changed_.notify_all();
+  std::lock_guard lock(workers_->mutex);
+  workers_->maxConcurrent = count;
+  workers_->startIfNeeded();
+  workers_->changed.notify_all();
 }
 
 std::int64_t OperationQueue::maxConcurrentOperationCount() const {
-  std::lock_guard lock(mutex_);
-  return maxConcurrent_;
+  std::lock_guard lock(workers_->mutex);
+  return workers_->maxConcurrent;
 }
 
 void OperationQueue::addOperation(std::shared_ptr<Operation> operation) {
   if (!operation) return;
-  std::lock_guard lock(mutex_);
-  if (stopping_) return;
-  bool known = std::find(waiting_.begin(), waiting_.end(), operation) != waiting_.end() ||
-               std::find(running_.begin(), running_.end(), operation) != running_.end();
+  Workers& w = *workers_;
+  std::lock_guard lock(w.mutex);
+  if (w.stopping) return;
+  bool known = std::find(w.waiting.begin(), w.waiting.end(), operation) != w.waiting.end() ||
+               std::find(w.running.begin(), w.running.end(), operation) != w.running.end();
   if (known || operation->isFinished()) return;
-  waiting_.push_back(std::move(operation));
-  startWorkersIfNeeded();
-  changed_.notify_all();
+  w.waiting.push_back(std::move(operation));
+  w.startIfNeeded();
+  w.changed.notify_all();
 }
 
 void OperationQueue::addOperationWithBlock(std::function<void()> block) {
@@ -123,61 +177,27 @@ void OperationQueue::addOperationWithBlock(std::function<void()> block) {
 }
 
 void OperationQueue::cancelAllOperations() {
-  std::lock_guard lock(mutex_);
-  for (auto& operation : waiting_) operation->cancel();
-  for (auto& operation : running_) operation->cancel();
+  std::lock_guard lock(workers_->mutex);
+  for (auto& operation : workers_->waiting) operation->cancel();
+  for (auto& operation : workers_->running) operation->cancel();
 }
 
 std::vector<std::shared_ptr<Operation>> OperationQueue::operations() const {
-  std::lock_guard lock(mutex_);
-  std::vector<std::shared_ptr<Operation>> all(running_.begin(), running_.end());
-  all.insert(all.end(), waiting_.begin(), waiting_.end());
+  std::lock_guard lock(workers_->mutex);
+  std::vector<std::shared_ptr<Operation>> all(workers_->running.begin(), workers_->running.end());
+  all.insert(all.end(), workers_->waiting.begin(), workers_->waiting.end());
   return all;
 }
 
 std::size_t OperationQueue::operationCount() const {
-  std::lock_guard lock(mutex_);
-  return running_.size() + waiting_.size();
+  std::lock_guard lock(workers_->mutex);
+  return workers_->running.size() + workers_->waiting.size();
 }
 
 void OperationQueue::waitUntilAllOperationsAreFinished() const {
-  std::unique_lock lock(mutex_);
-  changed_.wait(lock, [this] { return waiting_.empty() && running_.empty(); });
-}
-
-void OperationQueue::startWorkersIfNeeded() {
-  // One worker per operation that may run now; workers stay for later operations.
-  std::size_t limit = maxConcurrent_ < 1 ? waiting_.size() + running_.size()
-                                         : static_cast<std::size_t>(maxConcurrent_);
-  std::size_t wanted = std::min(limit, waiting_.size() + running_.size());
-  while (workers_.size() < wanted && idleWorkers_ < waiting_.size()) {
-    workers_.emplace_back([this] { workerLoop(); });
-    ++idleWorkers_;
-  }
-}
-
-void OperationQueue::workerLoop() {
-  std::unique_lock lock(mutex_);
-  for (;;) {
-    changed_.wait(lock, [this] {
-      bool room = maxConcurrent_ < 1 || running_.size() < static_cast<std::size_t>(maxConcurrent_);
-      return stopping_ || (room && !waiting_.empty());
-    });
-    if (stopping_) return;
-    std::shared_ptr<Operation> operation = std::move(waiting_.front());
-    waiting_.pop_front();
-    running_.push_back(operation);
-    --idleWorkers_;
-    lock.unlock();
-    operation->start();
-    lock.lock();
-    running_.erase(std::find(running_.begin(), running_.end(), operation));
-    ++idleWorkers_;
-    lock.unlock();
-    operation.reset();  // release what the work captured outside the queue's lock
-    lock.lock();
-    changed_.notify_all();
-  }
+  Workers& w = *workers_;
+  std::unique_lock lock(w.mutex);
+  w.changed.wait(lock, [&w] { return w.waiting.empty() && w.running.empty(); });
 }
 
 // --- MainQueue ----------------------------------------------------------------------
@@ -217,33 +237,16 @@ class InternalMainQueue final : public MainQueueDispatcher {
   std::deque<std::function<void()>> pending_;
 };
 
-struct DispatcherState {
-  std::mutex mutex;
-  std::shared_ptr<MainQueueDispatcher> installed;
-  std::shared_ptr<InternalMainQueue> internal = std::make_shared<InternalMainQueue>();
-};
-
-DispatcherState& dispatcherState() {
-  static DispatcherState* state = new DispatcherState;  // used until exit
-  return *state;
-}
-
 std::shared_ptr<InternalMainQueue> internalQueue() {
-  std::lock_guard lock(dispatcherState().mutex);
-  return dispatcherState().internal;
+  static const auto* queue =  // never destroyed: used until exit
+      new std::shared_ptr<InternalMainQueue>(std::make_shared<InternalMainQueue>());
+  return *queue;
 }
 
 }  // namespace
 
-void PlatformRegistry::setMainQueueDispatcher(std::shared_ptr<MainQueueDispatcher> dispatcher) {
-  std::lock_guard lock(dispatcherState().mutex);
-  dispatcherState().installed = std::move(dispatcher);
-}
-
-std::shared_ptr<MainQueueDispatcher> PlatformRegistry::mainQueueDispatcher() {
-  std::lock_guard lock(dispatcherState().mutex);
-  if (dispatcherState().installed) return dispatcherState().installed;
-  return dispatcherState().internal;
+std::shared_ptr<MainQueueDispatcher> detail::internalMainQueueDispatcher() {
+  return internalQueue();
 }
 
 void MainQueue::async(std::function<void()> work) {

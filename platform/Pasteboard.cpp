@@ -4,21 +4,6 @@
 
 namespace corvel {
 
-namespace {
-
-struct PasteboardSlot {
-  std::mutex mutex;
-  std::shared_ptr<Pasteboard> installed;
-  std::shared_ptr<Pasteboard> processLocal = std::make_shared<MemoryPasteboard>();
-};
-
-PasteboardSlot& slot() {
-  static PasteboardSlot* s = new PasteboardSlot;  // never destroyed: used until exit
-  return *s;
-}
-
-}  // namespace
-
 std::optional<Data> PasteboardItem::dataForType(const std::string& type) const {
   for (const auto& [t, data] : representations) {
     if (t == type) return data;
@@ -45,16 +30,6 @@ std::vector<std::string> PasteboardItem::types() const {
 Pasteboard::~Pasteboard() = default;
 
 std::shared_ptr<Pasteboard> Pasteboard::general() { return PlatformRegistry::generalPasteboard(); }
-
-void PlatformRegistry::setGeneralPasteboard(std::shared_ptr<Pasteboard> pasteboard) {
-  std::lock_guard lock(slot().mutex);
-  slot().installed = std::move(pasteboard);
-}
-
-std::shared_ptr<Pasteboard> PlatformRegistry::generalPasteboard() {
-  std::lock_guard lock(slot().mutex);
-  return slot().installed ? slot().installed : slot().processLocal;
-}
 
 std::int64_t MemoryPasteboard::clearContents() {
   std::lock_guard lock(mutex_);

@@ -1,7 +1,6 @@
-// Requests, the image request handler and the registry entry of the recogniser. The
-// engine itself lives in platform/tesseract/.
+// Requests and the image request handler. The recogniser behind them is the registry's;
+// the engine itself lives in platform/tesseract/.
 #include <algorithm>
-#include <mutex>
 
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
@@ -26,36 +25,6 @@ std::vector<RecognizedText> RecognizedTextObservation::topCandidates(
 }
 
 TextRecognizer::~TextRecognizer() = default;
-
-// --- registry -----------------------------------------------------------------------
-
-namespace {
-
-struct RecognizerState {
-  std::mutex mutex;
-  std::shared_ptr<TextRecognizer> installed;
-  std::shared_ptr<TextRecognizer> standard;  // made on first use
-};
-
-RecognizerState& recognizerState() {
-  static RecognizerState* state = new RecognizerState;  // used until exit
-  return *state;
-}
-
-}  // namespace
-
-void PlatformRegistry::setTextRecognizer(std::shared_ptr<TextRecognizer> recognizer) {
-  std::lock_guard lock(recognizerState().mutex);
-  recognizerState().installed = std::move(recognizer);
-}
-
-std::shared_ptr<TextRecognizer> PlatformRegistry::textRecognizer() {
-  std::lock_guard lock(recognizerState().mutex);
-  auto& state = recognizerState();
-  if (state.installed) return state.installed;
-  if (!state.standard) state.standard = TesseractRecognizer::init();
-  return state.standard;
-}
 
 // --- requests -----------------------------------------------------------------------
 

@@ -9,6 +9,7 @@
 #include <unordered_map>
 #include <unordered_set>
 
+#include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/PropertyList.h"
 #include "platform/BuiltinTypes.h"
 
@@ -324,14 +325,8 @@ std::optional<std::string> typeOfFile(const std::string& path) {
   struct stat info {};
   if (path.empty() || ::stat(path.c_str(), &info) != 0 || ::access(path.c_str(), R_OK) != 0)
     return std::nullopt;
-  std::string_view name(path);
-  while (name.size() > 1 && name.back() == '/') name.remove_suffix(1);
-  std::size_t slash = name.rfind('/');
-  if (slash != std::string_view::npos) name.remove_prefix(slash + 1);
-  // A leading dot starts a hidden name, not an extension.
-  std::size_t dot = name.rfind('.');
-  bool hasExtension = dot != std::string_view::npos && dot > 0 && dot + 1 < name.size();
-  std::string_view extension = hasExtension ? name.substr(dot + 1) : std::string_view();
+  std::string extension = pathExtension(path);
+  bool hasExtension = !extension.empty();
 
   TypeRegistry& types = TypeRegistry::shared();
   if (S_ISDIR(info.st_mode)) {

@@ -42,13 +42,6 @@ CORVEL_EXPORT extern const std::string AttachmentAttributeName;
 // The character an attachment stands on.
 inline constexpr char16_t AttachmentCharacter = u'\uFFFC';
 
-// ---- Category PencilDrawings: its dictionaries (see Corvelbase/PencilDrawings.h) ----
-
-// Drawing identifier (UTF-8) to stroke data: what goes to the pasteboard.
-using PencilDataDictionary = std::map<std::string, Data>;
-// Drawing identifier to drawing attachment: what the host keeps between load and save.
-using PencilAttachmentDictionary = std::map<std::string, std::shared_ptr<TextAttachment>>;
-
 // Options of the enumerations.
 enum AttributedStringEnumerationOptions : std::uint32_t {
   AttributedStringEnumerationReverse = 1u << 1,
@@ -127,77 +120,6 @@ class CORVEL_EXPORT AttributedString {
 
   // Equal text and equal attributes on every character.
   friend CORVEL_EXPORT bool operator==(const AttributedString& a, const AttributedString& b);
-
-  // ---- Category PencilDrawings (attachments/PencilDrawings*.cpp) ----
-  //
-  // Pencil drawings through insertion, cut, copy, paste, saving and loading. The host
-  // calls these around its own operations; Corvelbase/PencilDrawings.h describes the life
-  // of a drawing and what the host does at each step. A drawing's identifier is the base
-  // name of its files (last path component without extension): "<uuid>" for both
-  // "<uuid>.jpeg" and "<uuid>.pencildata". Call on the thread that edits the text.
-
-  // Replaces `range` (in one editing batch) with one attachment character holding a new
-  // RVMXScaledImageAttachment of `image` whose drawing is a new RVPencilAttachment of
-  // `pencilData` (type "public.data"); this writes "<uuid>.pencildata" and "<uuid>.jpeg"
-  // into the caches directory. A range not wholly inside the text changes nothing and
-  // writes no file.
-  void insertImage(const std::shared_ptr<Image>& image, const std::optional<Data>& pencilData,
-                   Range range);
-  // Identifier to stroke data of every drawing in `range` (clamped): each
-  // RVMXScaledImageAttachment with a pencilAttachment, keyed by the identifier of the
-  // filename of the picture's fileWrapper() as it answers now (its own "<uuid>.jpeg" at
-  // `saving` 1, hence preCutOrCopy). Pictures without a wrapper or filename are skipped;
-  // a later drawing under the same identifier replaces an earlier one, and one without
-  // stroke data removes the entry.
-  PencilDataDictionary pencilDataDictionaryForRange(Range range) const;
-  // Before the host's cut or copy of `range`: every RVMXTextAttachment in it gets
-  // `saving` 1, then pencilDataDict becomes pencilDataDictionaryForRange(range).
-  void preCutOrCopy(Range range) const;
-  // After the host's cut or copy: addPencilDataToClipboard(pencilDataDict); then, only
-  // when `range` still lies wholly inside the text, every RVMXTextAttachment in it gets
-  // `saving` 0 (after a cut that shortened the text past the range's end the cut
-  // attachments keep `saving` 1, as accepted behaviour); last, pencilDataDict is cleared.
-  void postCutOrCopy(Range range) const;
-  // Sets the keyed archive of `pencilData` on the general pasteboard under
-  // RVPencilPasteboardData, beside the types already there. Nothing for an absent or
-  // empty dictionary. When archiving fails it logs "Failed to copy pencil data to
-  // clipboard: <reason>" and writes nothing; a backend that refuses the data is not
-  // reported.
-  void addPencilDataToClipboard(const std::optional<PencilDataDictionary>& pencilData) const;
-  // Reads the general pasteboard's RVPencilPasteboardData item into
-  // pastedPencilDataDictionary: nothing changes when there is no such item; an item that
-  // is no keyed archive of a dictionary of strings to data (wrong classes, cycles,
-  // truncation, any other bytes) sets it to nullopt, silently.
-  void checkForPencilDataOnPaste() const;
-  // Takes the drawings out of a loaded text: every attachment whose file wrapper's
-  // preferredFilename, or failing that its filename, has the extension "pencildata"
-  // (exactly; "a.PENCILDATA" is not a drawing) loses its attachment attribute. The
-  // characters stay in the text as plain U+FFFC, so the length does not change. Returns
-  // identifierForAttachment to attachment (a later one under the same identifier wins).
-  PencilAttachmentDictionary removePencilAttachments();
-  // The identifier of the attachment's file wrapper's preferredFilename when it has one,
-  // else of its filename; nullopt without an attachment, wrapper or name.
-  std::optional<std::string> identifierForAttachment(
-      const std::shared_ptr<TextAttachment>& attachment) const;
-  // The identifier of the wrapper's filename only (never preferredFilename, unlike
-  // identifierForAttachment); nullopt without an attachment, wrapper or filename.
-  std::optional<std::string> fileIDForAttachment(
-      const std::shared_ptr<TextAttachment>& attachment) const;
-  // For every attachment run in text order whose attachment's wrapper has a name and
-  // whose identifier is a key of `pencilAttachments`, appends that drawing as one
-  // attachment character at the end of the text (a picture standing twice appends its
-  // drawing twice). Keys matching nothing, or no dictionary, leave the text unchanged.
-  void appendPencilAttachments(const std::optional<PencilAttachmentDictionary>& pencilAttachments);
-  // Before the host writes the text as RTFD: appendPencilAttachments when
-  // `pencilAttachments` is present and not empty. `range` is neither read nor written
-  // (it may be nullptr); the form without a dictionary changes nothing.
-  void preSaveRTFD(Range* range);
-  void preSaveRTFD(Range* range,
-                   const std::optional<PencilAttachmentDictionary>& pencilAttachments);
-  // After the write: removePencilAttachments, its result dropped. `range` is not used.
-  void postSaveRTFD(Range range);
-  // After the host loaded a document: nothing; a hook kept for the host.
-  void postLoadDocument();
 
  private:
   struct Run {

@@ -1,13 +1,28 @@
-// Files: whole-file reads, atomic writes, the user's caches directory and UUID text.
+// Files: path pieces, whole-file reads, atomic writes, the user's caches directory and
+// UUID text.
 #pragma once
 
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "Corvelbase/Export.h"
 #include "Corvelbase/platform/String.h"
 
 namespace corvel {
+
+// ---- Path pieces, as the desktop platform's path functions take them: trailing slashes
+// are ignored ("a/b.txt/" names b.txt), and a dot that starts a name begins no extension
+// (".hidden" has none). Paths are UTF-8; nothing here touches the file system.
+
+// The last component: "/x/b.jpeg/" gives "b.jpeg", "b" gives "b", "/" gives "/", "" gives "".
+CORVEL_EXPORT std::string lastPathComponent(std::string_view path);
+// What follows the last '.' of the last component, when that dot is not the component's
+// first character: "a.tar.gz/" gives "gz"; ".pencildata", "a." and "a" give "". Case kept.
+CORVEL_EXPORT std::string pathExtension(std::string_view path);
+// The path without trailing slashes and without its last component's extension and dot:
+// "/x/R.pencildata/" gives "/x/R", "a.b.c" gives "a.b", ".hidden" and "/" stay as they are.
+CORVEL_EXPORT std::string deletingPathExtension(std::string_view path);
 
 // The whole file, or nullopt when it cannot be read (missing, a directory, no access).
 CORVEL_EXPORT std::optional<Data> readFile(const std::string& path);

@@ -17,11 +17,9 @@
 #include <chrono>
 #include <condition_variable>
 #include <cstdint>
-#include <deque>
 #include <functional>
 #include <memory>
 #include <mutex>
-#include <thread>
 #include <vector>
 
 #include "Corvelbase/Export.h"
@@ -106,18 +104,9 @@ class CORVEL_EXPORT OperationQueue {
   void waitUntilAllOperationsAreFinished() const;
 
  private:
-  OperationQueue() = default;
-  void startWorkersIfNeeded();  // with mutex_ held
-  void workerLoop();
-
-  mutable std::mutex mutex_;
-  mutable std::condition_variable changed_;
-  std::deque<std::shared_ptr<Operation>> waiting_;
-  std::vector<std::shared_ptr<Operation>> running_;
-  std::vector<std::thread> workers_;
-  std::size_t idleWorkers_ = 0;
-  std::int64_t maxConcurrent_ = -1;
-  bool stopping_ = false;
+  struct Workers;  // the worker threads and the operations they share
+  OperationQueue();
+  const std::unique_ptr<Workers> workers_;
 };
 
 // Receives work for the main thread. A host implements it on its own main loop.

@@ -244,17 +244,6 @@ class CORVEL_EXPORT TesseractRecognizer final : public TextRecognizer {
     double minTimeoutSeconds = 60;
   };
 
-  // What the engine has done so far, for benchmarks and diagnostics.
-  struct Statistics {
-    std::uint64_t recognitions = 0;    // engine passes over an image (detection included)
-    double recognitionSeconds = 0;     // wall time inside the engine, summed over threads
-    double recognitionCpuSeconds = 0;  // CPU time of the threads inside the engine
-    std::uint64_t enginesStarted = 0;  // engines initialised (a pool miss each)
-    double engineStartSeconds = 0;
-    double engineStartCpuSeconds = 0;
-    std::size_t idleEngines = 0;
-  };
-
   static std::shared_ptr<TesseractRecognizer> init(Options options);
   static std::shared_ptr<TesseractRecognizer> init() { return init(Options()); }
   ~TesseractRecognizer() override;
@@ -268,17 +257,16 @@ class CORVEL_EXPORT TesseractRecognizer final : public TextRecognizer {
                                                                         std::int64_t revision,
                                                                         Error* error) override;
 
-  Statistics statistics() const;
   // Stops every idle engine (running recognitions keep theirs).
   void releaseIdleEngines();
   // The Tesseract model name of a language code ("eng" for "en-US"), or "" when the code
   // has none.
   static std::string modelForLanguageCode(const std::string& code);
 
-  struct Impl;
-
  private:
+  struct Impl;
   class PageRecognition;
+  friend struct TesseractRecognizerAccess;  // the engine's statistics, read internally
   explicit TesseractRecognizer(std::unique_ptr<Impl> impl);
   std::unique_ptr<Impl> impl_;
 };

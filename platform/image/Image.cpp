@@ -78,14 +78,14 @@ std::string corruptOrTruncated(l_int32 format, const std::string& why) {
          (why.empty() ? "" : " (" + why + ")");
 }
 
-// The bitmap of encoded bytes; with a `maxLongSide`, reduced to fit (a PNG while it is
-// decoded, anything else afterwards).
 // `bitmap` reduced to fit `maxLongSide`; itself when it fits or reducing fails.
 std::shared_ptr<Bitmap> reducedBitmap(std::shared_ptr<Bitmap> bitmap, std::uint32_t maxLongSide) {
   PIX* reduced = bitmap ? reducePix(bitmap->native().pix, maxLongSide) : nullptr;
   return reduced ? bitmapFromPix(reduced, nullptr) : bitmap;
 }
 
+// The bitmap of encoded bytes; with a `maxLongSide`, reduced to fit (a PNG while it is
+// decoded, anything else afterwards).
 std::shared_ptr<Bitmap> decodeBytes(const Data& bytes, std::string* failure,
                                     std::uint32_t maxLongSide = 0, Size* fullSize = nullptr) {
   quietLeptonica();

@@ -7,7 +7,7 @@
 #include "platform/DocumentBackends.h"
 #include "platform/image/BitmapNative.h"
 
-namespace corvel::document_backend {
+namespace corvel::detail {
 
 namespace {
 
@@ -107,4 +107,4 @@ std::shared_ptr<Document> openTiff(const std::string& path, Error* error) {
   return std::make_shared<TiffDocument>(path, static_cast<std::size_t>(pages));
 }
 
-}  // namespace corvel::document_backend
+}  // namespace corvel::detail

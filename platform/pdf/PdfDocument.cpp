@@ -16,7 +16,7 @@
 #include "platform/image/BitmapNative.h"
 #include "platform/pdf/PdfPages.h"
 
-namespace corvel::document_backend {
+namespace corvel::detail {
 
 namespace {
 
@@ -176,4 +176,4 @@ std::shared_ptr<Document> openPdf(const std::string& path, Error* error) {
   return std::make_shared<PdfDocument>(path, std::move(pdf), std::move(resolutions));
 }
 
-}  // namespace corvel::document_backend
+}  // namespace corvel::detail

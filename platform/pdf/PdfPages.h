@@ -4,7 +4,7 @@
 
 #include <qpdf/QPDFPageObjectHelper.hh>
 
-namespace corvel::document_backend {
+namespace corvel::detail {
 
 // The visible part of a page (its crop box within its media box) and its rotation.
 struct PageFrame {
@@ -38,4 +38,4 @@ struct PageFrame {
 // The frame of `page`; a page without a usable box is taken as US Letter.
 PageFrame pageFrame(QPDFPageObjectHelper& page);
 
-}  // namespace corvel::document_backend
+}  // namespace corvel::detail

@@ -16,23 +16,22 @@
 #include <qpdf/QPDFPageObjectHelper.hh>
 #include <qpdf/QPDFWriter.hh>
 
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
-#include <filesystem>
 #include <limits>
 #include <map>
 
 #include "Corvelbase/platform/Files.h"
 #include "platform/DocumentBackends.h"
+#include "platform/SiblingFiles.h"
 #include "platform/image/BitmapNative.h"
 #include "platform/pdf/PdfPages.h"
 
-namespace corvel::document_backend {
+namespace corvel::detail {
 
 PageFrame pageFrame(QPDFPageObjectHelper& page) {
   PageFrame frame;
@@ -344,19 +343,15 @@ void addPicturePage(QPDF& pdf, const Document& document, std::size_t index,
 // A temporary file beside `path` (in the temporary folder for standard output), open
 // for writing; "" when none can be made.
 std::string temporaryBeside(const std::string& path, int* fd) {
-  std::string pattern;
   if (path == "-") {
     const char* dir = std::getenv("TMPDIR");
-    pattern = std::string(dir && *dir ? dir : "/tmp") + "/corvel-pdf-XXXXXX";
-  } else {
-    std::filesystem::path target(path);
-    std::filesystem::path dir = target.parent_path().empty() ? "." : target.parent_path();
-    std::string name = ".";
-    name.append(target.filename().string()).append(".XXXXXX");
-    pattern = (dir / name).string();
+    std::string pattern = std::string(dir && *dir ? dir : "/tmp") + "/corvel-pdf-XXXXXX";
+    *fd = mkstemp(pattern.data());
+    return *fd < 0 ? "" : pattern;
   }
-  *fd = mkstemp(pattern.data());
-  return *fd < 0 ? "" : pattern;
+  std::string temporary;
+  *fd = detail::createSiblingFile(path, &temporary);
+  return *fd < 0 ? "" : temporary;
 }
 
 // Writes the PDF to a temporary file, so that a long document never sits in memory
@@ -412,15 +407,11 @@ bool emit(QPDF& pdf, std::size_t pages, const std::string& path, Error* error) {
     }
     return true;
   }
-  // mkstemp makes the file private; it gets the permissions an ordinary write would.
-  mode_t mask = umask(0);
-  umask(mask);
-  ::chmod(temporary.c_str(), 0666 & ~mask);
-  if (std::rename(temporary.c_str(), path.c_str()) != 0) {
+  cleanup.path.clear();  // from here the temporary file is replaceWithSibling's
+  if (!detail::replaceWithSibling(temporary, path)) {
     *error = makeDocumentError(DocumentErrorWrite, "cannot write " + path);
     return false;
   }
-  cleanup.path.clear();
   return true;
 }
 
@@ -471,4 +462,4 @@ bool writeSearchablePdf(const Document& document, const std::vector<TextLayerPag
   }
 }
 
-}  // namespace corvel::document_backend
+}  // namespace corvel::detail

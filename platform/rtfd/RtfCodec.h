@@ -21,7 +21,7 @@
 #include "Corvelbase/platform/Geometry.h"
 #include "Corvelbase/platform/TextAttachment.h"
 
-namespace corvel::rtfd {
+namespace corvel::detail {
 
 // An attachment as the RTF names it: its file name and, when given, its size in points.
 struct AttachmentReference {
@@ -45,4 +45,4 @@ std::string writeRTF(const AttributedString& text, Range range, const Attachment
 std::optional<AttributedString> readRTF(const std::uint8_t* bytes, std::size_t size,
                                         const AttachmentResolver& resolver);
 
-}  // namespace corvel::rtfd
+}  // namespace corvel::detail

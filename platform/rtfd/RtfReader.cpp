@@ -9,7 +9,7 @@
 #include "Corvelbase/platform/RTFD.h"
 #include "platform/rtfd/RtfCodec.h"
 
-namespace corvel::rtfd {
+namespace corvel::detail {
 
 namespace {
 
@@ -370,4 +370,4 @@ std::optional<AttributedString> readRTF(const std::uint8_t* bytes, std::size_t s
   }
 }
 
-}  // namespace corvel::rtfd
+}  // namespace corvel::detail

@@ -3,7 +3,7 @@
 
 #include "platform/rtfd/RtfCodec.h"
 
-namespace corvel::rtfd {
+namespace corvel::detail {
 
 namespace {
 
@@ -114,4 +114,4 @@ std::string writeRTF(const AttributedString& text, Range range, const Attachment
   return out;
 }
 
-}  // namespace corvel::rtfd
+}  // namespace corvel::detail

@@ -67,7 +67,7 @@ std::pair<std::shared_ptr<FileWrapper>, std::string> fileOf(const TextAttachment
 }
 
 std::shared_ptr<TextAttachment> attachmentFor(std::shared_ptr<FileWrapper> file,
-                                              const rtfd::AttachmentReference& reference) {
+                                              const detail::AttachmentReference& reference) {
   auto attachment = TextAttachment::initWithFileWrapper(std::move(file));
   if (attachment && reference.size)
     attachment->setBounds(Rect(0, 0, reference.size->width, reference.size->height));
@@ -86,7 +86,7 @@ std::optional<AttributedString> readWithFiles(
     const Data& rtf,
     const std::function<std::shared_ptr<FileWrapper>(const std::string&)>& lookUp) {
   std::map<std::string, std::shared_ptr<FileWrapper>> found;
-  rtfd::AttachmentResolver resolver = [&](const rtfd::AttachmentReference& reference) {
+  detail::AttachmentResolver resolver = [&](const detail::AttachmentReference& reference) {
     std::shared_ptr<FileWrapper> file;
     if (isSafeFileName(reference.name)) {
       auto it = found.find(reference.name);
@@ -94,7 +94,7 @@ std::optional<AttributedString> readWithFiles(
     }
     return attachmentFor(file, reference);
   };
-  return rtfd::readRTF(rtf.data(), rtf.size(), resolver);
+  return detail::readRTF(rtf.data(), rtf.size(), resolver);
 }
 
 }  // namespace
@@ -105,8 +105,8 @@ std::shared_ptr<FileWrapper> RTFDFileWrapperFromRange(const AttributedString& te
   bundle->addFileWrapper(FileWrapper::initRegularFileWithContents({}), RTFDTextFileName);
   std::map<const FileWrapper*, std::string> written;
   std::vector<std::shared_ptr<FileWrapper>> held;
-  rtfd::AttachmentNamer namer = [&](const std::shared_ptr<TextAttachment>& attachment)
-      -> std::optional<rtfd::AttachmentReference> {
+  detail::AttachmentNamer namer = [&](const std::shared_ptr<TextAttachment>& attachment)
+      -> std::optional<detail::AttachmentReference> {
     auto [file, wanted] = fileOf(*attachment);
     if (!file) return std::nullopt;
     auto it = written.find(file.get());
@@ -115,9 +115,9 @@ std::shared_ptr<FileWrapper> RTFDFileWrapperFromRange(const AttributedString& te
     if (name.empty()) return std::nullopt;
     written.emplace(file.get(), name);
     held.push_back(file);  // keeps the address in `written` unique while writing
-    return rtfd::AttachmentReference{name, sizeOf(*attachment)};
+    return detail::AttachmentReference{name, sizeOf(*attachment)};
   };
-  std::string rtf = rtfd::writeRTF(text, range, namer);
+  std::string rtf = detail::writeRTF(text, range, namer);
   bundle->removeFileWrapper(RTFDTextFileName);
   auto textFile = FileWrapper::initRegularFileWithContents(Data(rtf.begin(), rtf.end()));
   textFile->setPreferredFilename(RTFDTextFileName);

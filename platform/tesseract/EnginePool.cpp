@@ -5,7 +5,7 @@
 #include <sstream>
 #include <vector>
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 EnginePool::EnginePool(std::string dataPath, std::uint64_t maxIdleModelBytes)
     : dataPath_(std::move(dataPath)), maxIdleModelBytes_(maxIdleModelBytes) {}
@@ -112,4 +112,4 @@ std::size_t EnginePool::idleCount() const {
   return idle_.size();
 }
 
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

@@ -16,7 +16,7 @@
 
 #include <tesseract/baseapi.h>
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 struct EngineKey {
   std::string languages;   // Tesseract's form: "eng", "eng+fra", "osd"
@@ -58,4 +58,4 @@ class EnginePool {
   std::uint64_t idleBytes_ = 0;
 };
 
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

@@ -7,7 +7,7 @@
 
 #include "platform/image/BitmapNative.h"
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 namespace {
 
@@ -352,4 +352,4 @@ PIX* scalePage(PIX* page, double scale) {
   return pixScaleLI(source.get(), factor, factor);
 }
 
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

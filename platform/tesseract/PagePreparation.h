@@ -16,7 +16,7 @@
 #include <cstdint>
 #include <vector>
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 // The engine's own names for its binarisations (its "thresholding_method" values).
 enum class Threshold { Otsu = 0, Sauvola = 2 };
@@ -84,4 +84,4 @@ PIX* cropPage(PIX* page, const PageBox& box);
 // means); nullptr when that fails. Bilevel pages become grey.
 PIX* scalePage(PIX* page, double scale);
 
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

@@ -10,7 +10,7 @@
 
 #include "platform/image/BitmapNative.h"
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 namespace {
 
@@ -18,6 +18,10 @@ constexpr const char* kOrientationModel = "osd";
 // Orientation and script detection below these confidences is a guess.
 constexpr float kMinOrientationConfidence = 2.0f;
 constexpr float kMinScriptConfidence = 1.0f;
+// A word read with less confidence that is this many times as tall as the page's
+// typical word is a picture's part, not text (see dropGraphics).
+constexpr float kMinTextConfidence = 0.5f;
+constexpr double kMaxTextHeightRatio = 3.0;
 // A reading is poor below this mean confidence, or with fewer characters than this
 // share of the character-like shapes the page shows (when it shows enough to judge).
 constexpr double kPoorConfidence = 0.75, kUnreadableConfidence = 0.5;
@@ -120,9 +124,9 @@ PageReader::PageReader(std::string dataPath, std::uint64_t maxIdleModelBytes,
                        unsigned maxConcurrent)
     : pool_(std::move(dataPath), maxIdleModelBytes), gate_(maxConcurrent) {}
 
-TesseractRecognizer::Statistics PageReader::statistics() const {
+detail::TesseractStatistics PageReader::statistics() const {
   std::lock_guard lock(statsMutex_);
-  TesseractRecognizer::Statistics stats = stats_;
+  detail::TesseractStatistics stats = stats_;
   stats.idleEngines = pool_.idleCount();
   return stats;
 }
@@ -499,6 +503,41 @@ bool PageReader::readMissedRegions(const Page& page, const std::string& models,
   return true;
 }
 
+namespace {
+
+// Drops the words that are a picture's parts read as text: a bar of a chart, a rule or a
+// photograph's edge comes back as a doubtful "word" several times as tall as the page's
+// words. Real headings that tall read with good confidence and stay. A line that loses
+// words is made of the rest; one that loses all goes.
+void dropGraphics(std::vector<RecognizedTextObservation>& lines) {
+  std::vector<double> heights;
+  for (const auto& line : lines)
+    for (const auto& word : line.words)
+      if (word.confidence >= kMinTextConfidence) heights.push_back(word.boundingBox.size.height);
+  if (heights.size() < 3) return;
+  auto middle = heights.begin() + static_cast<std::ptrdiff_t>(heights.size() / 2);
+  std::nth_element(heights.begin(), middle, heights.end());
+  double tallest = kMaxTextHeightRatio * *middle;
+  auto graphic = [&](const RecognizedWord& word) {
+    return word.confidence < kMinTextConfidence && word.boundingBox.size.height > tallest;
+  };
+  std::erase_if(lines, [&](RecognizedTextObservation& line) {
+    if (std::erase_if(line.words, graphic) == 0) return false;
+    if (line.words.empty()) return true;
+    String text;
+    Rect box = line.words.front().boundingBox;
+    for (const auto& word : line.words) {
+      text += (text.empty() ? u"" : u" ") + word.string;
+      box = rectUnion(box, word.boundingBox);
+    }
+    line.candidates.front().string = std::move(text);
+    line.boundingBox = box;
+    return false;
+  });
+}
+
+}  // namespace
+
 // The words of the line `line` stands at the start of, for the word-level outputs
 // (hOCR, ALTO, TSV, a PDF's text layer). A copy of the iterator walks them, so the
 // caller's stepping by lines is unchanged.
@@ -532,6 +571,7 @@ void PageReader::collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult
   tesseract::LTRResultIterator* it = results.get();
   double width = pixGetWidth(page), height = pixGetHeight(page);
   std::size_t blocks = 0, paragraphs = 0;
+  std::vector<RecognizedTextObservation> lines;
   do {
     if (it->PageIterator::IsAtBeginningOf(tesseract::RIL_BLOCK)) ++blocks;
     if (it->PageIterator::IsAtBeginningOf(tesseract::RIL_PARA)) ++paragraphs;
@@ -553,12 +593,18 @@ void PageReader::collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult
     collectWords(*it, width, height, &observation.words);
     observation.block = blocks - 1;
     observation.paragraph = paragraphs - 1;
+    lines.push_back(std::move(observation));
+  } while (it->PageIterator::Next(tesseract::RIL_TEXTLINE));
+  dropGraphics(lines);
+  for (auto& observation : lines) {
+    const auto& [string, confidence] = observation.candidates.front();
+    std::string text = toUTF8(string);
     auto characters = static_cast<double>(
         std::count_if(text.begin(), text.end(), [](char c) { return c != ' '; }));
     out->characters += characters;
     out->weight += characters * confidence;
     out->observations.push_back(std::move(observation));
     out->text += text + "\n";
-  } while (it->PageIterator::Next(tesseract::RIL_TEXTLINE));
+  }
 }
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

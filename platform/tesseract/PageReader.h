@@ -19,8 +19,9 @@
 #include "Corvelbase/platform/TextRecognizer.h"
 #include "platform/tesseract/EnginePool.h"
 #include "platform/tesseract/PagePreparation.h"
+#include "platform/tesseract/TesseractStatistics.h"
 
-namespace corvel::tesseract_backend {
+namespace corvel::detail {
 
 struct PixDeleter {
   void operator()(PIX* pix) const { pixDestroy(&pix); }
@@ -59,7 +60,7 @@ struct Page {
   int fileResolution = 0;  // what the file states, 0 when nothing
   int resolution = 0;      // told to the engine; 0: the engine estimates it
   // Where the measures saw characters, in this page's pixels; empty once turned.
-  std::vector<tesseract_backend::PageBox> characters;
+  std::vector<detail::PageBox> characters;
 
   void replace(PIX* replacement) {
     owned.reset(replacement);
@@ -138,7 +139,7 @@ class PageReader {
 
   EnginePool& pool() { return pool_; }
   const EnginePool& pool() const { return pool_; }
-  TesseractRecognizer::Statistics statistics() const;
+  detail::TesseractStatistics statistics() const;
 
   // One reading of `page` with `models` and the settings. False with *error when the
   // engine cannot start, fails, or is stopped (cancelled, past the deadline, or
@@ -181,7 +182,7 @@ class PageReader {
   EnginePool pool_;
   Gate gate_;
   mutable std::mutex statsMutex_;
-  TesseractRecognizer::Statistics stats_;
+  detail::TesseractStatistics stats_;
 };
 
-}  // namespace corvel::tesseract_backend
+}  // namespace corvel::detail

@@ -8,29 +8,31 @@
 #include <thread>
 
 #include "Corvelbase/platform/TextRecognizer.h"
+#include "platform/Backends.h"
 #include "platform/LanguageDetection.h"
 #include "platform/RecognitionLanguages.h"
 #include "platform/image/BitmapNative.h"
 #include "platform/tesseract/PageReader.h"
+#include "platform/tesseract/TesseractStatistics.h"
 
 namespace corvel {
 
-using tesseract_backend::judge;
-using tesseract_backend::measurePage;
-using tesseract_backend::Page;
-using tesseract_backend::PageBox;
-using tesseract_backend::PagePlan;
-using tesseract_backend::PageReader;
-using tesseract_backend::PassResult;
-using tesseract_backend::PassSettings;
-using tesseract_backend::PlanLimits;
-using tesseract_backend::planPage;
-using tesseract_backend::preparePage;
-using tesseract_backend::Reading;
-using tesseract_backend::Stop;
-using tesseract_backend::Threshold;
-using tesseract_backend::toWhole;
-using tesseract_backend::Watch;
+using detail::judge;
+using detail::measurePage;
+using detail::Page;
+using detail::PageBox;
+using detail::PagePlan;
+using detail::PageReader;
+using detail::PassResult;
+using detail::PassSettings;
+using detail::PlanLimits;
+using detail::planPage;
+using detail::preparePage;
+using detail::Reading;
+using detail::Stop;
+using detail::Threshold;
+using detail::toWhole;
+using detail::Watch;
 
 namespace {
 
@@ -456,10 +458,21 @@ std::uint32_t TesseractRecognizer::maxUsefulLongSide(const TextRecognitionReques
                                                                 : 0;
 }
 
-TesseractRecognizer::Statistics TesseractRecognizer::statistics() const {
-  return impl_->reader.statistics();
+struct TesseractRecognizerAccess {
+  static const TesseractRecognizer::Impl& impl(const TesseractRecognizer& recognizer) {
+    return *recognizer.impl_;
+  }
+};
+
+detail::TesseractStatistics detail::tesseractStatistics(const TesseractRecognizer& recognizer) {
+  return TesseractRecognizerAccess::impl(recognizer).reader.statistics();
 }
 
 void TesseractRecognizer::releaseIdleEngines() { impl_->reader.pool().clear(); }
+
+// This backend is the registry's default recogniser.
+std::shared_ptr<TextRecognizer> detail::makeDefaultTextRecognizer() {
+  return TesseractRecognizer::init();
+}
 
 }  // namespace corvel

@@ -28,7 +28,8 @@ class DrawingLife : public ::testing::Test {
  protected:
   // Insert a drawing; returns its identifier.
   std::string insert(AttributedString& text, std::uint64_t at, Size size, const Data& strokes) {
-    text.insertImage(testing::makePicture(size.width, size.height), strokes, Range{at, 0});
+    PencilDrawings::insertImage(text, testing::makePicture(size.width, size.height), strokes,
+                                Range{at, 0});
     auto picture = std::dynamic_pointer_cast<RVMXScaledImageAttachment>(text.attachmentAtIndex(at));
     if (!picture) return "";
     own.insert(own.end(), {picture, picture->pencilAttachment()});
@@ -42,9 +43,9 @@ class DrawingLife : public ::testing::Test {
   void save(AttributedString& text, const std::string& path, PencilAttachmentDictionary drawings) {
     for (const auto& a : own) a->setSaving(kSavingWritingOut);
     Range whole{0, text.length()};
-    text.preSaveRTFD(&whole, drawings);
+    PencilDrawings::preSaveRTFD(text, &whole, drawings);
     EXPECT_TRUE(writeRTFDToPath(text, path));
-    text.postSaveRTFD(whole);
+    PencilDrawings::postSaveRTFD(text, whole);
     for (const auto& a : own) a->setSaving(kSavingEditing);
   }
 
@@ -52,8 +53,8 @@ class DrawingLife : public ::testing::Test {
   std::pair<AttributedString, PencilAttachmentDictionary> load(const std::string& path) {
     auto text = attributedStringWithContentsOfRTFD(path).value_or(AttributedString(u"unreadable"));
     std::uint64_t length = text.length();
-    auto drawings = text.removePencilAttachments();
-    text.postLoadDocument();
+    auto drawings = PencilDrawings::removePencilAttachments(text);
+    PencilDrawings::postLoadDocument(text);
     EXPECT_EQ(text.length(), length);
     return {text, drawings};
   }
@@ -74,11 +75,11 @@ TEST_F(DrawingLife, DrawingsComeThroughCopyPasteSaveAndLoadUnchanged) {
 
   // Copy "e <A> a" as the text system does: the drawings' item sits beside the flat RTFD
   // holding A alone.
-  text.preCutOrCopy(Range{5, 5});
+  PencilDrawings::preCutOrCopy(text, Range{5, 5});
   PasteboardItem written;
   written.setData(RTFDFromRange(text, Range{5, 5}), kFlatRTFD);
   pasteboard->writeItems({written});
-  text.postCutOrCopy(Range{5, 5});
+  PencilDrawings::postCutOrCopy(text, Range{5, 5});
   auto items = pasteboard->items();
   ASSERT_EQ(items.size(), 1u);
   EXPECT_EQ(items[0].types(), (std::vector<std::string>{kFlatRTFD, RVPencilPasteboardData}));
@@ -101,9 +102,9 @@ TEST_F(DrawingLife, DrawingsComeThroughCopyPasteSaveAndLoadUnchanged) {
   auto pasted = attributedStringWithRTFD(*items[0].dataForType(kFlatRTFD));
   ASSERT_TRUE(pasted);
   other.insertAttributedString(*pasted, 8);
-  other.checkForPencilDataOnPaste();
+  PencilDrawings::checkForPencilDataOnPaste(other);
   ASSERT_EQ(other.string(), u"Pasted: e \uFFFC a");
-  EXPECT_EQ(other.fileIDForAttachment(other.attachmentAtIndex(10)), a);
+  EXPECT_EQ(PencilDrawings::fileIDForAttachment(other, other.attachmentAtIndex(10)), a);
   EXPECT_EQ(pastedPencilDataDictionary, (PencilDataDictionary{{a, strokesA}}));
   EXPECT_EQ(testing::decodedSize(bytesOf(other.attachmentAtIndex(10))), (Size{240, 160}));
 
@@ -120,8 +121,8 @@ TEST_F(DrawingLife, DrawingsComeThroughCopyPasteSaveAndLoadUnchanged) {
   // Load: each drawing by its identifier, the pictures in place.
   auto [loaded, drawings] = load(documents.file("Note.rtfd"));
   ASSERT_EQ(drawings.size(), 2u);
-  EXPECT_EQ(loaded.fileIDForAttachment(loaded.attachmentAtIndex(7)), a);
-  EXPECT_EQ(loaded.fileIDForAttachment(loaded.attachmentAtIndex(15)), b);
+  EXPECT_EQ(PencilDrawings::fileIDForAttachment(loaded, loaded.attachmentAtIndex(7)), a);
+  EXPECT_EQ(PencilDrawings::fileIDForAttachment(loaded, loaded.attachmentAtIndex(15)), b);
   EXPECT_EQ(testing::decodedSize(bytesOf(loaded.attachmentAtIndex(15))), (Size{70, 20}));
 
   // The kept drawings go back in at the next save and come out again with their own

@@ -75,6 +75,8 @@ TEST(FileTypes, ClassTestsComeBeforeNameTests) {
       {PencilLike::make(), std::nullopt, false},
       {TextAttachment::init(), "E.pencildata", false},
       {ScaledLike::make(), "G.pencildata", false},
+      // Regression: a trailing slash hid the extension from the class test's name check.
+      {PencilLike::make(), "/x/D.pencildata/", true},
   };
   for (const auto& c : cases) {
     if (c.filename) c.attachment->setFileWrapper(testing::wrapperNamed(c.filename));

@@ -56,34 +56,35 @@ TEST(PencilDrawings, CutAndCopyWriteOnlyWhatTheyHoldAndResetOnlyInsideTheText) {
   testing::ScopedPasteboard pasteboard;
   testing::LogCapture log;
   AttributedString text(u"abc");
-  text.insertImage(testing::makePicture(8, 8), Data{3}, Range{1, 0});
-  text.insertImage(testing::makePicture(8, 8), Data{4}, Range{4, 0});
-  text.insertImage(testing::makePicture(8, 8), Data{5}, Range{9, 9});  // outside: nothing
+  PencilDrawings::insertImage(text, testing::makePicture(8, 8), Data{3}, Range{1, 0});
+  PencilDrawings::insertImage(text, testing::makePicture(8, 8), Data{4}, Range{4, 0});
+  PencilDrawings::insertImage(text, testing::makePicture(8, 8), Data{5},
+                              Range{9, 9});  // outside: nothing
   ASSERT_EQ(text.string(), u"a\uFFFCbc\uFFFC");
   auto cut = pictureAt(text, 1), exported = pictureAt(text, 4);
 
   // While editing the pictures give no file, so no drawing can be keyed by it.
-  EXPECT_TRUE(text.pencilDataDictionaryForRange(Range{0, 5}).empty());
+  EXPECT_TRUE(PencilDrawings::pencilDataDictionaryForRange(text, Range{0, 5}).empty());
   // A copy without drawings writes nothing and says nothing.
-  text.preCutOrCopy(Range{2, 2});
-  text.postCutOrCopy(Range{2, 2});
+  PencilDrawings::preCutOrCopy(text, Range{2, 2});
+  PencilDrawings::postCutOrCopy(text, Range{2, 2});
   EXPECT_EQ(pasteboard->changeCount(), 0);
 
   // A cut past the new end still writes the item and clears the dictionary, but resets
   // nothing: not the cut picture, nor one that the shorter text has moved into range.
   exported->setSaving(kSavingTextExport);
-  text.preCutOrCopy(Range{1, 3});
+  PencilDrawings::preCutOrCopy(text, Range{1, 3});
   EXPECT_EQ(pencilDataDict, (PencilDataDictionary{{*cut->pencilAttachment()->uuid(), {3}}}));
   text.deleteCharactersInRange(Range{1, 3});
-  text.postCutOrCopy(Range{1, 3});
+  PencilDrawings::postCutOrCopy(text, Range{1, 3});
   EXPECT_TRUE(pasteboard->dataForType(RVPencilPasteboardData));
   EXPECT_FALSE(pencilDataDict);
   EXPECT_EQ(cut->saving(), kSavingWritingOut);
   EXPECT_EQ(exported->saving(), kSavingTextExport);
   // An end that wraps past 2^64 lies past the end too; a range inside resets.
-  text.postCutOrCopy(Range{1, ~std::uint64_t{0}});
+  PencilDrawings::postCutOrCopy(text, Range{1, ~std::uint64_t{0}});
   EXPECT_EQ(exported->saving(), kSavingTextExport);
-  text.postCutOrCopy(Range{1, 1});
+  PencilDrawings::postCutOrCopy(text, Range{1, 1});
   EXPECT_EQ(exported->saving(), kSavingEditing);
   EXPECT_TRUE(log.lines().empty());
 }
@@ -103,8 +104,10 @@ TEST(PencilDrawings, TheTwoIdentifiersDifferOnPreferredFilename) {
   };
   AttributedString text;
   for (std::size_t i = 0; i < std::size(cases); ++i) {
-    EXPECT_EQ(text.identifierForAttachment(cases[i].attachment), cases[i].identifier) << i;
-    EXPECT_EQ(text.fileIDForAttachment(cases[i].attachment), cases[i].fileID) << i;
+    EXPECT_EQ(PencilDrawings::identifierForAttachment(text, cases[i].attachment),
+              cases[i].identifier)
+        << i;
+    EXPECT_EQ(PencilDrawings::fileIDForAttachment(text, cases[i].attachment), cases[i].fileID) << i;
   }
 }
 
@@ -122,14 +125,16 @@ TEST(PencilDrawings, SavingAppendsInTextOrderAndRemovingLeavesTheCharacters) {
   // No dictionary, an empty one, keys matching nothing or a null drawing, the form
   // without a dictionary: nothing changes, and the range is never touched.
   Range range{123, 456};
-  text.preSaveRTFD(&range);
-  text.preSaveRTFD(nullptr, PencilAttachmentDictionary{});
-  text.preSaveRTFD(&range, PencilAttachmentDictionary{{"NONE", drawingOne}, {"ONE", nullptr}});
-  text.appendPencilAttachments(std::nullopt);
+  PencilDrawings::preSaveRTFD(text, &range);
+  PencilDrawings::preSaveRTFD(text, nullptr, PencilAttachmentDictionary{});
+  PencilDrawings::preSaveRTFD(text, &range,
+                              PencilAttachmentDictionary{{"NONE", drawingOne}, {"ONE", nullptr}});
+  PencilDrawings::appendPencilAttachments(text, std::nullopt);
   EXPECT_EQ(text, original);
   EXPECT_EQ(range, (Range{123, 456}));
 
-  text.preSaveRTFD(&range, PencilAttachmentDictionary{{"ONE", drawingOne}, {"TWO", drawingTwo}});
+  PencilDrawings::preSaveRTFD(text, &range,
+                              PencilAttachmentDictionary{{"ONE", drawingOne}, {"TWO", drawingTwo}});
   std::uint64_t end = original.length();
   ASSERT_EQ(text.length(), end + 3);
   EXPECT_EQ(text.attachmentAtIndex(end), drawingTwo);
@@ -137,7 +142,7 @@ TEST(PencilDrawings, SavingAppendsInTextOrderAndRemovingLeavesTheCharacters) {
   EXPECT_EQ(text.attachmentAtIndex(end + 2), drawingTwo);  // its picture stands twice
 
   EXPECT_EQ(
-      text.removePencilAttachments(),
+      PencilDrawings::removePencilAttachments(text),
       (PencilAttachmentDictionary{{"ONE", drawingOne}, {"TWO", drawingTwo}, {"t", viaFilename}}));
   EXPECT_EQ(text.length(), end + 3);  // the characters stay, without their attachments
   EXPECT_EQ(text.string()[3], AttachmentCharacter);
@@ -161,12 +166,12 @@ TEST(PencilDrawingsHostile, PasteboardItemsThatAreNoDrawingsAreDroppedSilently) 
   for (const Data* item : {&truncated, &huge}) {
     pastedPencilDataDictionary = PencilDataDictionary{{"before", {0}}};
     ASSERT_TRUE(pasteboard->setData(*item, RVPencilPasteboardData));
-    text.checkForPencilDataOnPaste();
+    PencilDrawings::checkForPencilDataOnPaste(text);
     EXPECT_FALSE(pastedPencilDataDictionary) << item->size();
   }
   pasteboard->clearContents();
   pastedPencilDataDictionary = PencilDataDictionary{};
-  text.checkForPencilDataOnPaste();
+  PencilDrawings::checkForPencilDataOnPaste(text);
   EXPECT_EQ(pastedPencilDataDictionary, PencilDataDictionary{});
   EXPECT_TRUE(log.lines().empty());
 }
@@ -191,14 +196,14 @@ TEST(PencilDrawingsHostile, BundlesGiveOnlyTheDrawingsTheyReallyHold) {
   ASSERT_TRUE(text);
   std::uint64_t length = text->length();
   PencilDataDictionary found;
-  for (const auto& [identifier, attachment] : text->removePencilAttachments())
+  for (const auto& [identifier, attachment] : PencilDrawings::removePencilAttachments(*text))
     found[identifier] = attachment->fileWrapper()->regularFileContents().value_or(Data{});
   EXPECT_EQ(found, (PencilDataDictionary{{"A", {7}}, {"D", {}}, {"S", {8}}}));
   EXPECT_EQ(text->length(), length);
   std::vector<std::optional<std::string>> left;
   for (std::uint64_t i = 0; i < length; ++i)
     if (auto attachment = text->attachmentAtIndex(i))
-      left.push_back(text->fileIDForAttachment(attachment));
+      left.push_back(PencilDrawings::fileIDForAttachment(*text, attachment));
   EXPECT_EQ(left, (std::vector<std::optional<std::string>>{"A", std::nullopt}));
 }
 

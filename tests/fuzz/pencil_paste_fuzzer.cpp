@@ -18,7 +18,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   board->clearContents();
   board->setData(item, RVPencilPasteboardData);
   pastedPencilDataDictionary = PencilDataDictionary{{"stale", Data{1}}};
-  AttributedString(u"\uFFFC").checkForPencilDataOnPaste();
+  PencilDrawings::checkForPencilDataOnPaste(AttributedString(u"\uFFFC"));
   FUZZ_CHECK(pastedPencilDataDictionary == KeyedArchive::unarchiveDictionary(item));
   return 0;
 }

@@ -49,8 +49,15 @@ TEST(BlockRecord, RecordGeometryDescriptionAndCopy) {
   EXPECT_EQ(toUTF8(b->description()), "(98.50%) 'abc'");
 }
 
+// A host's own kind of block, for the class test of equality.
+struct HostBlock : RVRecognitionBlock {
+  HostBlock()
+      : RVRecognitionBlock(u"word", Rect{0.1, 0.2, 0.3, 0.4}, 50, RVRecognitionBlockLevelLine) {}
+};
+
 TEST(BlockRecord, EqualityByValue) {
   auto base = block(u"word", 50);
+  auto host = std::make_shared<HostBlock>();
   auto nan = block(u"n", 1, Rect{kNaN, 0, 1, 1});
   auto twin = block(u"word", 50);  // children, match type and spacing take no part
   twin->setMatchType(RVBlockMatchSameColumn);
@@ -72,6 +79,9 @@ TEST(BlockRecord, EqualityByValue) {
       {"nil and empty text", block(std::nullopt, 1), block(u"", 1), false},
       {"NaN box and itself", nan, nan, true},
       {"NaN box and its twin", nan, block(u"n", 1, Rect{kNaN, 0, 1, 1}), false},
+      // Regression: equality ignored the class, so a host's subclass equalled a plain block.
+      {"plain block and host subclass", base, host, true},
+      {"host subclass and plain block", host, base, false},
   };
   for (const Case& c : cases) EXPECT_EQ(c.a->isEqual(c.b), c.equal) << c.name;
   // Equal blocks hash alike whatever their children, as hashed collections need.

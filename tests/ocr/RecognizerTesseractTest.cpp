@@ -13,6 +13,7 @@
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
+#include "platform/tesseract/TesseractStatistics.h"
 #include "support/TestSupport.h"
 #include "support/TextDistance.h"
 #include "support/WordScore.h"
@@ -279,15 +280,15 @@ TEST(TesseractEnginePool, EnginesAreReusedAndIdleOnesBeyondTheCapStopped) {
     auto outcome = perform(fixture("lines/line-002"), TextRecognitionLevelFast, {code});
     ASSERT_FALSE(outcome.error);
     ASSERT_EQ(outcome.results->size(), 1u);
-    EXPECT_EQ(recognizer->statistics().idleEngines, 1u);
-    started.push_back(recognizer->statistics().enginesStarted);
+    EXPECT_EQ(detail::tesseractStatistics(*recognizer).idleEngines, 1u);
+    started.push_back(detail::tesseractStatistics(*recognizer).enginesStarted);
   }
   // English is reused, then stopped while French runs.
   EXPECT_EQ(started, (std::vector<std::uint64_t>{1, 1, 2, 3}));
-  EXPECT_EQ(recognizer->statistics().recognitions, 4u);
-  EXPECT_GT(recognizer->statistics().recognitionSeconds, 0);
+  EXPECT_EQ(detail::tesseractStatistics(*recognizer).recognitions, 4u);
+  EXPECT_GT(detail::tesseractStatistics(*recognizer).recognitionSeconds, 0);
   recognizer->releaseIdleEngines();
-  EXPECT_EQ(recognizer->statistics().idleEngines, 0u);
+  EXPECT_EQ(detail::tesseractStatistics(*recognizer).idleEngines, 0u);
   PlatformRegistry::setTextRecognizer(nullptr);
 }
 

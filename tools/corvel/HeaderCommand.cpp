@@ -1,9 +1,9 @@
 // corvel header: a header value of an e-mail message, optionally just its address.
 #include <iostream>
 
-#include "Commands.h"
 #include "Corvelbase/Email.h"
-#include "TextInput.h"
+#include "tools/corvel/Commands.h"
+#include "tools/corvel/TextInput.h"
 
 namespace corvel::tool {
 namespace {

@@ -1,4 +1,4 @@
-#include "JsonConversion.h"
+#include "tools/corvel/JsonConversion.h"
 
 namespace corvel::tool {
 

@@ -1,9 +1,9 @@
 // corvel lang: the dominant language of a file or of standard input.
 #include <iostream>
 
-#include "Commands.h"
 #include "Corvelbase/Language.h"
-#include "TextInput.h"
+#include "tools/corvel/Commands.h"
+#include "tools/corvel/TextInput.h"
 
 namespace corvel::tool {
 namespace {

@@ -7,8 +7,8 @@
 #include <iostream>
 #include <string>
 
-#include "Commands.h"
 #include "Corvelbase/RVVisionOCR.h"
+#include "tools/corvel/Commands.h"
 
 namespace corvel::tool {
 

@@ -16,11 +16,11 @@
 #include <regex>
 #include <string>
 
-#include "Commands.h"
 #include "Corvelbase/RVRecognitionBlock.h"
 #include "Corvelbase/RVTextLayoutAnalyser.h"
 #include "Corvelbase/platform/Files.h"
-#include "JsonConversion.h"
+#include "tools/corvel/Commands.h"
+#include "tools/corvel/JsonConversion.h"
 
 namespace corvel::tool {
 

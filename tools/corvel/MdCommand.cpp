@@ -12,10 +12,10 @@
 #include <optional>
 #include <set>
 
-#include "Commands.h"
 #include "Corvelbase/MarkdownCommands.h"
 #include "Corvelbase/platform/Files.h"
-#include "TextInput.h"
+#include "tools/corvel/Commands.h"
+#include "tools/corvel/TextInput.h"
 
 namespace corvel::tool {
 

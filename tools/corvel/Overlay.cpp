@@ -1,4 +1,4 @@
-#include "Overlay.h"
+#include "tools/corvel/Overlay.h"
 
 #include <algorithm>
 #include <cmath>

@@ -4,10 +4,10 @@
 #include <iostream>
 #include <iterator>
 
-#include "Commands.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/RTFD.h"
 #include "Corvelbase/platform/TextAttachment.h"
+#include "tools/corvel/Commands.h"
 
 namespace corvel::tool {
 namespace {

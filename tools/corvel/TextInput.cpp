@@ -1,4 +1,4 @@
-#include "TextInput.h"
+#include "tools/corvel/TextInput.h"
 
 #include <iostream>
 #include <iterator>

@@ -3,8 +3,8 @@
 
 #include <iostream>
 
-#include "Commands.h"
 #include "Corvelbase/platform/TypeRegistry.h"
+#include "tools/corvel/Commands.h"
 
 namespace corvel::tool {
 namespace {
