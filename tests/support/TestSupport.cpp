@@ -41,8 +41,8 @@ std::string fixturePath(const std::string& relative) {
   return std::string(CORVEL_FIXTURES_DIR) + "/" + relative;
 }
 
-std::string fixtureText(const std::string& relative) {
-  auto bytes = readFile(fixturePath(relative));
+std::string fileText(const std::string& path) {
+  auto bytes = readFile(path);
   return bytes ? std::string(bytes->begin(), bytes->end()) : std::string();
 }
 

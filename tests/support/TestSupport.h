@@ -41,8 +41,11 @@ class TempDir {
 
 // Path of a committed fixture: tests/fixtures/<relative>.
 std::string fixturePath(const std::string& relative);
-// The bytes of that fixture as a string; empty when it cannot be read.
-std::string fixtureText(const std::string& relative);
+// The bytes of a file, or of a fixture, as a string; empty when it cannot be read.
+std::string fileText(const std::string& path);
+inline std::string fixtureText(const std::string& relative) {
+  return fileText(fixturePath(relative));
+}
 
 // Runs a shell command, returning its exit status and standard output.
 struct CommandResult {
@@ -50,5 +53,9 @@ struct CommandResult {
   std::string output;
 };
 CommandResult runCommand(const std::string& command);
+// Runs the command-line program with `arguments` (which may redirect its streams).
+inline CommandResult corvel(const std::string& arguments) {
+  return runCommand(std::string(CORVEL_TOOL_PATH) + " " + arguments);
+}
 
 }  // namespace corvel::testing
