@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <limits>
-#include <nlohmann/json.hpp>
 #include <random>
 
 #include "BlockTestHelpers.h"
@@ -15,7 +14,7 @@
 namespace corvel {
 namespace {
 
-using nlohmann::json;
+using testing::articleLines;
 using testing::line;
 using testing::text;
 
@@ -160,22 +159,6 @@ TEST(LayoutRobustness, NonFiniteAndNegativeGeometry) {
 }
 
 // ---- Whole pages.
-
-const std::string kArticle = testing::fixturePath("layout/article.json");
-
-RVBlockArray articleLines() {
-  auto bytes = readFile(kArticle);
-  EXPECT_TRUE(bytes);
-  RVBlockArray lines;
-  if (!bytes) return lines;
-  for (const json& entry : json::parse(bytes->begin(), bytes->end())) {
-    lines.push_back(RVRecognitionBlock::initWithText(
-        fromUTF8(entry["text"].get<std::string>()),
-        rectFromString(entry["boundingBox"].get<std::string>()), entry["confidence"].get<double>(),
-        static_cast<RVRecognitionBlockLevel>(entry["level"].get<int>())));
-  }
-  return lines;
-}
 
 // The reading order a person gives the page, as the fixture's line numbers: columns of
 // paragraphs of lines. The heading; the left column, with the caption (17) that sits

@@ -28,6 +28,7 @@ struct Delivery {
   String text;
   std::optional<Error> error;
   std::thread::id thread;
+  std::int64_t code() const { return error ? error->code : 0; }
 };
 
 RVVisionOCR::Completion recordInto(Delivery* delivery) {
@@ -103,13 +104,11 @@ TEST_F(OcrJob, RequestSettingsFollowThePlatformVersion) {
     Delivery delivery;
     finish(RVVisionOCR::ocrCGImage(whitePage(), c.codes, c.fast, recordInto(&delivery)));
     ASSERT_EQ(recorder->requests().size(), 1u) << c.name;
-    const auto request = recorder->requests()[0];
-    EXPECT_EQ(request.revision, c.revision) << c.name;
-    EXPECT_TRUE(request.usesLanguageCorrection) << c.name;
-    EXPECT_EQ(request.recognitionLevel, c.fast ? 1 : 0) << c.name;
-    EXPECT_EQ(request.languages, c.languages) << c.name;
-    EXPECT_EQ(request.automaticallyDetectsLanguage, c.detect) << c.name;
-    EXPECT_EQ(std::pair(request.width, request.height), std::pair(40u, 30u)) << c.name;
+    const auto r = recorder->requests()[0];
+    EXPECT_EQ(std::tuple(r.revision, r.usesLanguageCorrection, r.recognitionLevel, r.languages,
+                         r.automaticallyDetectsLanguage, r.width, r.height),
+              std::tuple(c.revision, true, c.fast ? 1 : 0, c.languages, c.detect, 40u, 30u))
+        << c.name;
   }
 }
 
@@ -209,15 +208,10 @@ TEST_F(OcrJob, StoppingARunningJobStopsItsRecognitionWhereCancellingLetsItFinish
   EXPECT_EQ(fake_->running(), 1u);
   fake_->release();
   settle();
-  ASSERT_EQ(stopped.calls, 1);
-  EXPECT_EQ(stopped.text, u"");
-  ASSERT_TRUE(stopped.error);
-  EXPECT_EQ(stopped.error->code, TextRecognitionErrorCancelled);
-  EXPECT_EQ(finished.calls, 1);
-  EXPECT_FALSE(finished.error);
-  // The job's timeout reached the recogniser with the request.
-  auto requests = fake_->requests();
-  EXPECT_EQ(requests.front().timeout, 42);
+  EXPECT_EQ(std::tuple(stopped.calls, stopped.text, stopped.code()),
+            std::tuple(1, String(), TextRecognitionErrorCancelled));
+  EXPECT_EQ(std::pair(finished.calls, finished.error), std::pair(1, std::optional<Error>()));
+  EXPECT_EQ(fake_->requests().front().timeout, 42);  // the job's, with the request
 }
 
 TEST_F(OcrJob, TheCompletionRunsOnTheMainQueueAndTheJobAndImageAreLetGoThere) {
@@ -257,9 +251,8 @@ TEST_F(OcrJob, ARecogniserErrorReachesTheCompletionUnchangedAndIsLogged) {
   Delivery delivery;
   auto job = startBlank(&delivery);
   finish(job);
-  ASSERT_EQ(delivery.calls, 1);
-  EXPECT_EQ(delivery.text, u"");
-  EXPECT_EQ(delivery.error, failure);
+  EXPECT_EQ(std::tuple(delivery.calls, delivery.text, delivery.error),
+            std::tuple(1, String(), std::optional(failure)));
   EXPECT_TRUE(job->layoutAnalyser()->textBlocks()->empty());
   EXPECT_EQ(log.lines(), (std::vector<std::string>{"Error: " + failure.description()}));
 }
@@ -291,11 +284,10 @@ TEST_F(OcrJob, EveryBadImageEndsInAnErrorSayingWhatWentWrong) {
   for (const auto& [source, reasonWord] : cases) {
     Delivery delivery;
     finish(start(source, recordInto(&delivery)));
-    ASSERT_EQ(delivery.calls, 1) << source;
-    EXPECT_EQ(delivery.text, u"") << source;
-    ASSERT_TRUE(delivery.error) << source;
+    ASSERT_EQ(std::tuple(delivery.calls, delivery.text, delivery.code()),
+              std::tuple(1, String(), TextRecognitionErrorImageUnreadable))
+        << source;
     EXPECT_EQ(delivery.error->domain, TextRecognitionErrorDomain) << source;
-    EXPECT_EQ(delivery.error->code, TextRecognitionErrorImageUnreadable) << source;
     EXPECT_NE(delivery.error->userInfoString("Error reason").find(reasonWord), std::string::npos)
         << source << ": " << delivery.error->userInfoString("Error reason");
   }
@@ -316,10 +308,9 @@ TEST_F(OcrJob, WithoutTextRecognitionTheJobEndsAtOnceWithTheUnsupportedError) {
     Delivery delivery;
     auto job =
         RVVisionOCR::ocrImageAtPath(u"/no/such/file.png", {"en-US"}, false, recordInto(&delivery));
-    ASSERT_EQ(delivery.calls, 1) << available;  // synchronously, on this thread
-    EXPECT_EQ(delivery.thread, std::this_thread::get_id());
-    EXPECT_EQ(delivery.text, u"");
-    EXPECT_EQ(delivery.error, unsupported);
+    // Synchronously, on this thread.
+    EXPECT_EQ(std::tuple(delivery.calls, delivery.thread, delivery.text, delivery.error),
+              std::tuple(1, std::this_thread::get_id(), String(), std::optional(unsupported)));
     EXPECT_FALSE(job->ocrOperation() || job->layoutAnalyser()) << available;
     job->cancelOCRJob();  // nothing to cancel
     // Without a completion there is nothing to report to.

@@ -13,6 +13,7 @@
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/TextRecognizer.h"
+#include "RecognitionTestHelpers.h"
 #include "platform/tesseract/TesseractStatistics.h"
 #include "support/TestSupport.h"
 #include "support/TextDistance.h"
@@ -26,44 +27,12 @@ using namespace std::chrono_literals;
 constexpr const char* kDataPath = "/usr/share/tesseract-ocr/5/tessdata";
 
 using testing::characterErrorRate;
+using testing::Outcome;
+using testing::perform;
 
 // The source text of a fixture page (tests/fixtures/ocr/NAME.txt).
 std::string fixtureText(const std::string& name) {
   return testing::fixtureText("ocr/" + name + ".txt");
-}
-
-struct Outcome {
-  std::optional<std::vector<RecognizedTextObservation>> results;
-  std::optional<Error> error;
-  int handlerCalls = 0;
-
-  std::string text() const {
-    std::string out;
-    if (results)
-      for (const auto& o : *results) out += toUTF8(o.candidates.at(0).string) + "\n";
-    return out;
-  }
-};
-
-Outcome perform(std::shared_ptr<ImageRequestHandler> handler, std::int64_t level,
-                std::vector<std::string> languages, bool detect = false) {
-  Outcome outcome;
-  auto request = TextRecognitionRequest::initWithCompletionHandler(
-      [&](TextRecognitionRequest& r, const std::optional<Error>& error) {
-        ++outcome.handlerCalls;
-        outcome.results = r.results();
-        outcome.error = error;
-      });
-  request->setRecognitionLevel(level);
-  request->setRecognitionLanguages(std::move(languages));
-  request->setAutomaticallyDetectsLanguage(detect);
-  Error error;
-  bool ok = handler->performRequests({request}, &error);
-  EXPECT_EQ(ok, !outcome.error.has_value());
-  if (!ok && outcome.error) {
-    EXPECT_EQ(error, *outcome.error);
-  }
-  return outcome;
 }
 
 std::shared_ptr<Image> image(const std::string& name) {
@@ -191,17 +160,10 @@ TEST_F(TesseractRecognition, HardDocumentsAreReadAtBothLevels) {
 
 TEST_F(TesseractRecognition, RecognitionStopsWhenCancelledOrPastItsDeadline) {
   auto run = [&](std::function<void(TextRecognitionRequest&)> configure, double* seconds) {
-    Outcome outcome;
-    auto request = TextRecognitionRequest::initWithCompletionHandler(
-        [&](TextRecognitionRequest& r, const std::optional<Error>& error) {
-          outcome.results = r.results();
-          outcome.error = error;
-        });
-    request->setRecognitionLanguages({"en-US"});
-    configure(*request);
     auto started = std::chrono::steady_clock::now();
     // A full page: most of its time is the recognition of words, where the engine looks.
-    fixture("pages/page-01")->performRequests({request}, nullptr);
+    auto outcome = perform(fixture("pages/page-01"), TextRecognitionLevelAccurate, {"en-US"}, false,
+                           configure);
     *seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - started).count();
     return outcome;
   };
