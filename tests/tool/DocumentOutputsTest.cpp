@@ -73,10 +73,8 @@ TEST(DocumentOutputs, TheSearchablePdfIsTheOriginalPlusTextAtItsPlaces) {
             "Typed words stay as they are ");
   run("cd " + dir.path() + " && pdfimages -j " + document("mixed.pdf") +
       " before && pdfimages -j " + out + " after");
-  EXPECT_EQ(
-      testing::runCommand("cmp " + dir.file("before-000.jpg") + " " + dir.file("after-000.jpg"))
-          .status,
-      0);
+  std::string picture = testing::fileText(dir.file("before-000.jpg"));
+  EXPECT_TRUE(!picture.empty() && picture == testing::fileText(dir.file("after-000.jpg")));
 
   auto words =
       tsvWords(testing::corvel("ocr --lang en " + document("mixed.pdf") + " --format tsv").output);
