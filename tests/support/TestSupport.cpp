@@ -18,13 +18,6 @@ LogCapture::LogCapture() {
   });
 }
 
-LogCapture::~LogCapture() { PlatformRegistry::setLogSink(nullptr); }
-
-std::vector<std::string> LogCapture::lines() const {
-  std::lock_guard lock(mutex_);
-  return lines_;
-}
-
 TempDir::TempDir() {
   std::filesystem::create_directories(CORVEL_TEST_WORK_DIR);
   std::string pattern = std::string(CORVEL_TEST_WORK_DIR) + "/tmp.XXXXXX";
@@ -35,10 +28,6 @@ TempDir::TempDir() {
 TempDir::~TempDir() {
   std::error_code ec;
   std::filesystem::remove_all(path_, ec);
-}
-
-std::string fixturePath(const std::string& relative) {
-  return std::string(CORVEL_FIXTURES_DIR) + "/" + relative;
 }
 
 std::string fileText(const std::string& path) {
