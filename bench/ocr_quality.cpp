@@ -3,7 +3,7 @@
 //
 // Pages: the OCR corpus (real pages with their true text; --corpus DIR, by default
 // ../shared/ocr-corpus beside the source tree) and pages of the kinds real documents
-// bring that render_hard.py draws with their true text (forms clean and at 90 dpi,
+// bring that bench/render_hard.py draws with their true text (forms clean and at 90 dpi,
 // receipts scanned and photographed, dark and light slides, colour and grey tables,
 // charts, shadowed and photographed pages, court filings, depositions, three-column
 // articles, turned pages), rendered into the build folder on the first run (--hard DIR
@@ -151,7 +151,7 @@ int main(int argc, char** argv) {
   if (!fs::is_directory(hard) || fs::is_empty(hard)) {
     // Debian's interpreter, which has the python3-pil and python3-numpy the script needs.
     std::string render = "/usr/bin/python3 " +
-                         (source / "tests/fixtures/ocr/render_hard.py").string() + " " +
+                         (source / "bench/render_hard.py").string() + " " +
                          hard.string() + " --count " + std::to_string(count);
     std::printf("rendering the hard pages: %s\n", render.c_str());
     std::fflush(stdout);

@@ -6,7 +6,7 @@
 #include "Corvelbase/RVMXTextAttachment.h"
 #include "Corvelbase/platform/Base64.h"
 #include "Corvelbase/platform/Files.h"
-#include "support/TestSupport.h"
+#include "tests/attachments/PencilTestSupport.h"
 
 namespace corvel {
 namespace {
@@ -77,18 +77,14 @@ TEST(BaseEncode, Base64ChoosesImageThenContentsThenFile) {
     a->setImage(c.image);
     a->setFileWrapper(c.wrapper);
     auto encoded = a->encodedBase64Data();
-    ASSERT_EQ(encoded.has_value(), c.source != kNothing) << c.name;
-    if (!encoded) continue;
-    auto decoded = base64Decoding(text(*encoded));
-    ASSERT_TRUE(decoded) << c.name;
+    auto decoded = encoded ? base64Decoding(text(*encoded)) : std::nullopt;
+    EXPECT_EQ(decoded.has_value(), c.source != kNothing) << c.name;
     if (c.source == kContentsAsTheyAre) {
-      EXPECT_EQ(*decoded, *c.contents) << c.name;
-      continue;
+      EXPECT_EQ(decoded, c.contents) << c.name;
+    } else if (decoded) {
+      EXPECT_TRUE(isJPEG(*decoded)) << c.name;
+      EXPECT_EQ(testing::decodedSize(decoded), (Size{24, 16})) << c.name;
     }
-    EXPECT_TRUE(isJPEG(*decoded)) << c.name;
-    auto back = Image::initWithData(*decoded);
-    ASSERT_TRUE(back) << c.name;
-    EXPECT_EQ(back->size(), (Size{24, 16})) << c.name;
   }
 }
 

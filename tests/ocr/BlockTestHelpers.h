@@ -2,10 +2,12 @@
 #pragma once
 
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <string>
 
 #include "Corvelbase/RVRecognitionBlock.h"
 #include "Corvelbase/RVTextLayoutAnalyser.h"
+#include "support/TestSupport.h"
 
 namespace corvel::testing {
 
@@ -17,6 +19,18 @@ inline std::shared_ptr<RVRecognitionBlock> line(const std::string& text, double 
 
 inline std::string text(const std::shared_ptr<RVRecognitionBlock>& block) {
   return block && block->text() ? toUTF8(*block->text()) : "(nil)";
+}
+
+// The line blocks of the committed article page (tests/fixtures/layout/article.json).
+inline RVBlockArray articleLines() {
+  RVBlockArray lines;
+  for (const auto& entry : nlohmann::json::parse(fixtureText("layout/article.json"))) {
+    lines.push_back(RVRecognitionBlock::initWithText(
+        fromUTF8(entry["text"].get<std::string>()),
+        rectFromString(entry["boundingBox"].get<std::string>()), entry["confidence"].get<double>(),
+        static_cast<RVRecognitionBlockLevel>(entry["level"].get<int>())));
+  }
+  return lines;
 }
 
 // Restores a tunable global when the test ends, whatever it did to it.

@@ -92,8 +92,7 @@ class DocumentJob : public ::testing::Test {
   }
   void TearDown() override {
     fake_->release();
-    RVVisionOCR::ocrQueue()->waitUntilAllOperationsAreFinished();
-    main_->drain();
+    settle();
     PlatformRegistry::setTextRecognizer(nullptr);
     PlatformRegistry::setMainQueueDispatcher(nullptr);
   }
@@ -122,14 +121,9 @@ TEST_F(DocumentJob, EveryPageIsDeliveredOnceInOrderThenTheCompletion) {
   Run run;
   auto job = start(document("pages.tif"), &run);
   settle();
-  ASSERT_EQ(run.pages.size(), 2u);
-  for (std::size_t i = 0; i < 2; ++i) {
-    EXPECT_EQ(run.pages[i].index, i);
-    EXPECT_FALSE(run.pages[i].error);
-    EXPECT_EQ(toUTF8(run.pages[i].text), "words");
-    EXPECT_EQ(run.pages[i].resolution, 150);
-  }
-  EXPECT_EQ(run.pages[1].pixelSize, (Size{1000, 455}));
+  std::vector<std::tuple<std::size_t, bool, std::string>> got;  // index, error, text
+  for (const auto& p : run.pages) got.emplace_back(p.index, p.error.has_value(), toUTF8(p.text));
+  EXPECT_EQ(got, (decltype(got){{0, false, "words"}, {1, false, "words"}}));
   ASSERT_TRUE(run.completion);
   EXPECT_FALSE(*run.completion);
   EXPECT_EQ(job->pagesDelivered(), 2u);
@@ -157,10 +151,8 @@ TEST_F(DocumentJob, CancellingStopsRunningPagesAndDeliversTheRestCancelled) {
   job->cancel();
   settle();
   ASSERT_EQ(run.pages.size(), 2u);
-  for (const auto& page : run.pages) {
-    ASSERT_TRUE(page.error);
-    EXPECT_EQ(page.error->code, TextRecognitionErrorCancelled);
-  }
+  for (const auto& page : run.pages)
+    EXPECT_EQ(page.error.value_or(Error{}).code, TextRecognitionErrorCancelled);
   ASSERT_TRUE(run.completion && *run.completion);
   EXPECT_EQ((*run.completion)->code, TextRecognitionErrorCancelled);
 }

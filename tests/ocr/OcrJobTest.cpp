@@ -28,6 +28,7 @@ struct Delivery {
   String text;
   std::optional<Error> error;
   std::thread::id thread;
+  std::int64_t code() const { return error ? error->code : 0; }
 };
 
 RVVisionOCR::Completion recordInto(Delivery* delivery) {
@@ -91,9 +92,7 @@ TEST_F(OcrJob, RequestSettingsFollowThePlatformVersion) {
   } cases[] = {
       // with no codes the newest systems detect the language, older ones read English
       {"newest, fast", {}, {}, true, 3, {}, true},
-      {"13", {13, 0, 0}, {}, false, 3, {}, true},
       {"12, fast", {12, 6, 0}, {}, true, 2, {"en-US"}, false},
-      {"11", {11, 0, 0}, {}, false, 2, {"en-US"}, false},
       {"10.15", {10, 15, 0}, {}, false, std::nullopt, {"en-US"}, false},
       // given codes are passed on, the forced-primary one first
       {"newest, French and Japanese", {}, {"fr-FR", "ja-JP"}, false, 3, {"ja-JP", "fr-FR"}, false},
@@ -105,13 +104,11 @@ TEST_F(OcrJob, RequestSettingsFollowThePlatformVersion) {
     Delivery delivery;
     finish(RVVisionOCR::ocrCGImage(whitePage(), c.codes, c.fast, recordInto(&delivery)));
     ASSERT_EQ(recorder->requests().size(), 1u) << c.name;
-    const auto request = recorder->requests()[0];
-    EXPECT_EQ(request.revision, c.revision) << c.name;
-    EXPECT_TRUE(request.usesLanguageCorrection) << c.name;
-    EXPECT_EQ(request.recognitionLevel, c.fast ? 1 : 0) << c.name;
-    EXPECT_EQ(request.languages, c.languages) << c.name;
-    EXPECT_EQ(request.automaticallyDetectsLanguage, c.detect) << c.name;
-    EXPECT_EQ(std::pair(request.width, request.height), std::pair(40u, 30u)) << c.name;
+    const auto r = recorder->requests()[0];
+    EXPECT_EQ(std::tuple(r.revision, r.usesLanguageCorrection, r.recognitionLevel, r.languages,
+                         r.automaticallyDetectsLanguage, r.width, r.height),
+              std::tuple(c.revision, true, c.fast ? 1 : 0, c.languages, c.detect, 40u, 30u))
+        << c.name;
   }
 }
 
@@ -142,67 +139,58 @@ TEST_F(OcrJob, EachObservationsBestReadingBecomesALineBlock) {
   EXPECT_NE(delivery.text.find(u"half sure"), String::npos);
 }
 
-// Lines of a receipt as an engine places them: items and prices in blocks of their own
-// side by side, then a paragraph of two long lines.
-std::vector<RecognizedTextObservation> receiptLines() {
-  auto at = [](const char* text, Rect box, std::size_t block, std::size_t paragraph) {
-    RecognizedTextObservation o = line(text, 0.9f, box);
-    o.block = block;
-    o.paragraph = paragraph;
-    return o;
-  };
-  return {at("MILK", Rect(0.1, 0.80, 0.2, 0.04), 0, 0),
-          at("BREAD", Rect(0.1, 0.70, 0.2, 0.04), 0, 0),
-          at("1.99", Rect(0.8, 0.805, 0.1, 0.04), 1, 1),
-          at("2.49", Rect(0.8, 0.695, 0.1, 0.04), 1, 1),
-          at("Thank you for shopping with us today", Rect(0.1, 0.40, 0.8, 0.04), 2, 2),
-          at("and come back again soon please", Rect(0.1, 0.35, 0.7, 0.04), 2, 2)};
+// Lines as an engine places them, each with its block (and paragraph).
+RecognizedTextObservation at(const char* text, Rect box, std::size_t block) {
+  RecognizedTextObservation o = line(text, 0.9f, box);
+  o.block = o.paragraph = block;
+  return o;
 }
 
 TEST_F(OcrJob, ReadingOrdersGiveTheEnginesParagraphsAndKeepRowsTogether) {
-  fake_->setObservations(receiptLines());
+  // A receipt: items and prices in blocks side by side, then a paragraph of long lines.
+  const std::vector<RecognizedTextObservation> receipt = {
+      at("MILK", Rect(0.1, 0.80, 0.2, 0.04), 0),
+      at("BREAD", Rect(0.1, 0.70, 0.2, 0.04), 0),
+      at("1.99", Rect(0.8, 0.805, 0.1, 0.04), 1),
+      at("2.49", Rect(0.8, 0.695, 0.1, 0.04), 1),
+      at("Thank you for shopping", Rect(0.1, 0.40, 0.8, 0.04), 2),
+      at("and come back soon", Rect(0.1, 0.35, 0.7, 0.04), 2)};
+  // Two columns of running text, whose lines align row by row.
+  const std::vector<RecognizedTextObservation> columns = {
+      at("the first column runs on", Rect(0.05, 0.8, 0.4, 0.03), 0),
+      at("and on down the page", Rect(0.05, 0.75, 0.4, 0.03), 0),
+      at("the second column starts", Rect(0.55, 0.8, 0.4, 0.03), 1),
+      at("and ends at the foot", Rect(0.55, 0.75, 0.4, 0.03), 1)};
   struct Case {
     RVReadingOrder order;
+    const std::vector<RecognizedTextObservation>& lines;
     String text;
+    std::size_t columns;  // in the tree: one per block, but rows side by side make one
   } cases[] = {
-      {RVReadingOrderEngine,
-       u"MILK\nBREAD\n\n1.99\n2.49\n\nThank you for shopping with us today\n"
-       u"and come back again soon please"},
-      {RVReadingOrderRows,
-       u"MILK 1.99\nBREAD 2.49\n\nThank you for shopping with us today\n"
-       u"and come back again soon please"},
+      {RVReadingOrderEngine, receipt,
+       u"MILK\nBREAD\n\n1.99\n2.49\n\nThank you for shopping\nand come back soon", 3},
+      {RVReadingOrderRows, receipt,
+       u"MILK 1.99\nBREAD 2.49\n\nThank you for shopping\nand come back soon", 2},
+      // Long lines side by side stay apart.
+      {RVReadingOrderRows, columns,
+       u"the first column runs on\nand on down the page\n\n"
+       u"the second column starts\nand ends at the foot",
+       2},
   };
   for (const auto& c : cases) {
+    fake_->setObservations(c.lines);
     Delivery delivery;
     auto job = RVVisionOCR::init();
     job->setReadingOrder(c.order);
     job->startOcrCGImage(whitePage(), {}, false, recordInto(&delivery));
     finish(job);
     EXPECT_EQ(delivery.text, c.text) << c.order;
-    // The tree holds the same order: one column per block (rows make one of two).
-    const auto& columns = *job->layoutAnalyser()->layoutBlocks();
-    ASSERT_EQ(columns.size(), c.order == RVReadingOrderRows ? 2u : 3u);
-    EXPECT_EQ(columns[0]->level(), RVRecognitionBlockLevelColumn);
+    // The tree holds the same order.
+    const auto& tree = *job->layoutAnalyser()->layoutBlocks();
+    ASSERT_EQ(tree.size(), c.columns) << c.order;
+    EXPECT_EQ(tree[0]->level(), RVRecognitionBlockLevelColumn);
     EXPECT_EQ(job->layoutAnalyser()->text(), c.text);
   }
-  // Two columns of running text stay apart however their lines align.
-  auto text = [](const char* t, double x, double y, std::size_t block) {
-    RecognizedTextObservation o = line(t, 0.9f, Rect(x, y, 0.4, 0.03));
-    o.block = o.paragraph = block;
-    return o;
-  };
-  fake_->setObservations({text("the first column runs on here", 0.05, 0.8, 0),
-                          text("and on down the page", 0.05, 0.75, 0),
-                          text("the second column starts here", 0.55, 0.8, 1),
-                          text("and ends at the foot", 0.55, 0.75, 1)});
-  Delivery delivery;
-  auto job = RVVisionOCR::init();
-  job->setReadingOrder(RVReadingOrderRows);
-  job->startOcrCGImage(whitePage(), {}, false, recordInto(&delivery));
-  finish(job);
-  EXPECT_EQ(delivery.text,
-            u"the first column runs on here\nand on down the page\n\n"
-            u"the second column starts here\nand ends at the foot");
 }
 
 TEST_F(OcrJob, StoppingARunningJobStopsItsRecognitionWhereCancellingLetsItFinish) {
@@ -220,15 +208,10 @@ TEST_F(OcrJob, StoppingARunningJobStopsItsRecognitionWhereCancellingLetsItFinish
   EXPECT_EQ(fake_->running(), 1u);
   fake_->release();
   settle();
-  ASSERT_EQ(stopped.calls, 1);
-  EXPECT_EQ(stopped.text, u"");
-  ASSERT_TRUE(stopped.error);
-  EXPECT_EQ(stopped.error->code, TextRecognitionErrorCancelled);
-  EXPECT_EQ(finished.calls, 1);
-  EXPECT_FALSE(finished.error);
-  // The job's timeout reached the recogniser with the request.
-  auto requests = fake_->requests();
-  EXPECT_EQ(requests.front().timeout, 42);
+  EXPECT_EQ(std::tuple(stopped.calls, stopped.text, stopped.code()),
+            std::tuple(1, String(), TextRecognitionErrorCancelled));
+  EXPECT_EQ(std::pair(finished.calls, finished.error), std::pair(1, std::optional<Error>()));
+  EXPECT_EQ(fake_->requests().front().timeout, 42);  // the job's, with the request
 }
 
 TEST_F(OcrJob, TheCompletionRunsOnTheMainQueueAndTheJobAndImageAreLetGoThere) {
@@ -268,24 +251,16 @@ TEST_F(OcrJob, ARecogniserErrorReachesTheCompletionUnchangedAndIsLogged) {
   Delivery delivery;
   auto job = startBlank(&delivery);
   finish(job);
-  ASSERT_EQ(delivery.calls, 1);
-  EXPECT_EQ(delivery.text, u"");
-  EXPECT_EQ(delivery.error, failure);
+  EXPECT_EQ(std::tuple(delivery.calls, delivery.text, delivery.error),
+            std::tuple(1, String(), std::optional(failure)));
   EXPECT_TRUE(job->layoutAnalyser()->textBlocks()->empty());
   EXPECT_EQ(log.lines(), (std::vector<std::string>{"Error: " + failure.description()}));
 }
 
 TEST_F(OcrJob, EveryBadImageEndsInAnErrorSayingWhatWentWrong) {
+  // The image's own reasons are the image suite's; here each way in reaches the completion.
   testing::TempDir dir;
-  auto png = readFile(testing::fixturePath("ocr/one-column.png")).value();
-  auto write = [&](const std::string& name, const Data& bytes) {
-    EXPECT_TRUE(writeFileAtomically(dir.file(name), bytes));
-    return dir.file(name);
-  };
-  Data truncated(png.begin(), png.begin() + static_cast<std::ptrdiff_t>(png.size() / 3));
-  Data noPixels = png, huge = png;  // PNG headers claiming 0 x 0 and 30000 x 30000 pixels
-  for (std::size_t i = 16; i < 24; ++i) noPixels[i] = 0, huge[i] = (i % 4 == 2) ? 0x75 : 0;
-  huge[19] = huge[23] = 0x30;
+  ASSERT_TRUE(writeFileAtomically(dir.file("z.png"), {}));
   // Sources with a scheme go in as URLs, the others as paths, but for the two null images.
   auto start = [](const std::string& source, RVVisionOCR::Completion done) {
     if (source == "null image") return RVVisionOCR::ocrImage(nullptr, {}, false, done);
@@ -299,10 +274,7 @@ TEST_F(OcrJob, EveryBadImageEndsInAnErrorSayingWhatWentWrong) {
     const char* reasonWord;
   } cases[] = {
       {"", "no file"},
-      {write("t.png", truncated), "corrupt"},
-      {write("z.png", {}), "not an image"},
-      {write("n.png", noPixels), "PNG"},
-      {write("h.png", huge), "too large"},
+      {dir.file("z.png"), "not an image"},
       {"https://example.invalid/p.png", "https"},
       {"file:///no/such/page.png", "cannot be read"},
       {"null image", "no image"},
@@ -312,11 +284,10 @@ TEST_F(OcrJob, EveryBadImageEndsInAnErrorSayingWhatWentWrong) {
   for (const auto& [source, reasonWord] : cases) {
     Delivery delivery;
     finish(start(source, recordInto(&delivery)));
-    ASSERT_EQ(delivery.calls, 1) << source;
-    EXPECT_EQ(delivery.text, u"") << source;
-    ASSERT_TRUE(delivery.error) << source;
+    ASSERT_EQ(std::tuple(delivery.calls, delivery.text, delivery.code()),
+              std::tuple(1, String(), TextRecognitionErrorImageUnreadable))
+        << source;
     EXPECT_EQ(delivery.error->domain, TextRecognitionErrorDomain) << source;
-    EXPECT_EQ(delivery.error->code, TextRecognitionErrorImageUnreadable) << source;
     EXPECT_NE(delivery.error->userInfoString("Error reason").find(reasonWord), std::string::npos)
         << source << ": " << delivery.error->userInfoString("Error reason");
   }
@@ -337,10 +308,9 @@ TEST_F(OcrJob, WithoutTextRecognitionTheJobEndsAtOnceWithTheUnsupportedError) {
     Delivery delivery;
     auto job =
         RVVisionOCR::ocrImageAtPath(u"/no/such/file.png", {"en-US"}, false, recordInto(&delivery));
-    ASSERT_EQ(delivery.calls, 1) << available;  // synchronously, on this thread
-    EXPECT_EQ(delivery.thread, std::this_thread::get_id());
-    EXPECT_EQ(delivery.text, u"");
-    EXPECT_EQ(delivery.error, unsupported);
+    // Synchronously, on this thread.
+    EXPECT_EQ(std::tuple(delivery.calls, delivery.thread, delivery.text, delivery.error),
+              std::tuple(1, std::this_thread::get_id(), String(), std::optional(unsupported)));
     EXPECT_FALSE(job->ocrOperation() || job->layoutAnalyser()) << available;
     job->cancelOCRJob();  // nothing to cancel
     // Without a completion there is nothing to report to.
@@ -399,7 +369,6 @@ TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
                       {{"yue-Hans", "en-US"}, true},
                       {{"en-US"}, false},  // no secondary codes, even alone
                       {{"ja-JP", "ko-KR"}, false},
-                      {{"ja-JP", "xx-XX"}, false},
                       {{"xx-XX"}, false}};
   for (const auto& c : combinations)
     EXPECT_EQ(RVVisionOCR::isLanguageCombinationValid(c.codes), c.valid)
@@ -412,7 +381,6 @@ TEST(LanguageCatalogue, CombinationsFastSupportAndOrdering) {
   struct Order {
     Codes in, out;
   } orders[] = {{{}, {}},
-                {{"en-US", "fr-FR"}, {"en-US", "fr-FR"}},
                 {{"en-US", "ko-KR", "ja-JP"}, {"ko-KR", "en-US", "ja-JP"}},
                 {{"xx-XX", "de-DE", "yue-Hant"}, {"yue-Hant", "xx-XX", "de-DE"}}};
   auto job = RVVisionOCR::init();

@@ -11,6 +11,7 @@
 #include "Corvelbase/RVVisionOCR.h"
 #include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/Platform.h"
+#include "RecognitionTestHelpers.h"
 #include "support/FakeRecognizer.h"
 #include "support/ForwardingRecognizer.h"
 #include "support/TestSupport.h"
@@ -22,10 +23,7 @@ namespace {
 // The page every recogniser reads: a heading over two columns, and its source text.
 constexpr const char* kPage = "ocr/two-columns";
 
-std::string pageText() {
-  auto bytes = readFile(testing::fixturePath(std::string(kPage) + ".txt"));
-  return bytes ? std::string(bytes->begin(), bytes->end()) : std::string();
-}
+std::string pageText() { return testing::fixtureText(std::string(kPage) + ".txt"); }
 
 // The fake answers with the page's lines, stacked from the top as a page prints them.
 std::shared_ptr<testing::FakeRecognizer> scriptedFake() {
@@ -60,32 +58,13 @@ class RecognizerContract : public ::testing::Test {
   static void SetUpTestSuite() { recognizer_ = Kind::make(); }
   static void TearDownTestSuite() { recognizer_.reset(); }
 
-  struct Outcome {
-    std::optional<std::vector<RecognizedTextObservation>> results;
-    std::optional<Error> error;
-    int handlerCalls = 0;
-  };
   // Performs one fast request on `bitmap` through a handler, as the jobs do.
-  Outcome perform(std::shared_ptr<Bitmap> bitmap, std::vector<std::string> codes,
-                  std::function<bool()> cancelled = nullptr) {
+  testing::Outcome perform(std::shared_ptr<Bitmap> bitmap, std::vector<std::string> codes,
+                           std::function<bool()> cancelled = nullptr) {
     PlatformRegistry::setTextRecognizer(recognizer_);
-    Outcome outcome;
-    auto request = TextRecognitionRequest::initWithCompletionHandler(
-        [&](TextRecognitionRequest& r, const std::optional<Error>& error) {
-          ++outcome.handlerCalls;
-          outcome.results = r.results();
-          outcome.error = error;
-        });
-    request->setRecognitionLevel(TextRecognitionLevelFast);
-    request->setRecognitionLanguages(std::move(codes));
-    request->setCancellationCheck(std::move(cancelled));
-    Error error;
-    bool ok = ImageRequestHandler::initWithCGImage(std::move(bitmap), {})
-                  ->performRequests({request}, &error);
-    EXPECT_EQ(ok, !outcome.error);
-    if (outcome.error) {
-      EXPECT_EQ(error, *outcome.error);
-    }
+    auto outcome = testing::perform(ImageRequestHandler::initWithCGImage(std::move(bitmap), {}),
+                                    TextRecognitionLevelFast, std::move(codes), false,
+                                    [&](auto& r) { r.setCancellationCheck(cancelled); });
     PlatformRegistry::setTextRecognizer(nullptr);
     return outcome;
   }
@@ -121,7 +100,6 @@ TYPED_TEST(RecognizerContract, ReadsAPageOfKnownTextAsLinesFromTheTop) {
   ASSERT_EQ(outcome.handlerCalls, 1);
   ASSERT_FALSE(outcome.error) << outcome.error->description();
   ASSERT_TRUE(outcome.results && !outcome.results->empty());
-  std::string text;
   const double headingTop = rectGetMaxY(outcome.results->front().boundingBox);
   for (const auto& line : *outcome.results) {
     const Rect& box = line.boundingBox;
@@ -137,37 +115,34 @@ TYPED_TEST(RecognizerContract, ReadsAPageOfKnownTextAsLinesFromTheTop) {
     // a descender or a comma that its line box leaves out.
     const Rect around{box.origin.x - 0.005, box.origin.y - 0.005, box.size.width + 0.01,
                       box.size.height + 0.01};
-    for (const auto& word : line.words) {
+    for (const auto& word : line.words)
       EXPECT_TRUE(rectContainsRect(around, word.boundingBox))
           << stringFromRect(box) << " " << stringFromRect(word.boundingBox);
-    }
-    text += toUTF8(line.candidates[0].string) + "\n";
   }
   EXPECT_EQ(toUTF8(outcome.results->front().candidates[0].string), "Notes from the Reading Room");
+  const std::string text = outcome.text();
   auto expected = testing::normalised(pageText()), actual = testing::normalised(text);
   EXPECT_LT(testing::editDistance(expected, actual), expected.size() * 3 / 100) << text;
 }
 
-TYPED_TEST(RecognizerContract, ACancelledRequestFailsWithoutResults) {
-  auto outcome = this->perform(this->page(), {"en-US"}, [] { return true; });
-  ASSERT_EQ(outcome.handlerCalls, 1);
-  ASSERT_TRUE(outcome.error);
-  EXPECT_EQ(outcome.error->domain, TextRecognitionErrorDomain);
-  EXPECT_EQ(outcome.error->code, TextRecognitionErrorCancelled);
-  EXPECT_FALSE(outcome.results);
-}
-
-// A code the recogniser cannot read is an error object naming the code, never a page read
-// in some other language.
-TYPED_TEST(RecognizerContract, ACodeItCannotReadIsAnErrorNamingIt) {
-  for (const char* code : {"xx-XX", ""}) {
-    auto outcome = this->perform(this->page(), {"en-US", code});
+// A cancelled request, and a code the recogniser cannot read, are error objects without
+// results; the code is named, never a page read in some other language.
+TYPED_TEST(RecognizerContract, ACancelledRequestOrACodeItCannotReadFailsWithoutResults) {
+  const std::tuple<std::vector<std::string>, bool, std::int64_t> cases[] = {
+      {{"en-US"}, true, TextRecognitionErrorCancelled},
+      {{"en-US", "xx-XX"}, false, TextRecognitionErrorUnsupportedLanguage},
+      {{"en-US", ""}, false, TextRecognitionErrorUnsupportedLanguage}};
+  for (const auto& [codes, cancel, errorCode] : cases) {
+    const std::string code = codes.back();
+    auto outcome = this->perform(this->page(), codes, [&] { return cancel; });
     ASSERT_EQ(outcome.handlerCalls, 1) << code;
     ASSERT_TRUE(outcome.error) << code;
     EXPECT_EQ(outcome.error->domain, TextRecognitionErrorDomain);
-    EXPECT_EQ(outcome.error->code, TextRecognitionErrorUnsupportedLanguage);
-    EXPECT_NE(outcome.error->userInfoString("Error reason").find("\"" + std::string(code) + "\""),
-              std::string::npos);
+    EXPECT_EQ(outcome.error->code, errorCode) << code;
+    if (!cancel) {
+      EXPECT_NE(outcome.error->userInfoString("Error reason").find("\"" + code + "\""),
+                std::string::npos);
+    }
     EXPECT_FALSE(outcome.results);
   }
 }

@@ -1,7 +1,7 @@
 #include <gtest/gtest.h>
 
+#include <bit>
 #include <cmath>
-#include <cstring>
 #include <limits>
 #include <random>
 
@@ -49,13 +49,9 @@ TEST(RectText, WritesThePlatformFormAndReadsItBackExactly) {
   std::mt19937_64 rng(7);
   std::uniform_int_distribution<std::uint64_t> bits;
   for (int i = 0; i < 2000; ++i) {
-    double v[4];
-    for (double& d : v) {
-      do {
-        std::uint64_t b = bits(rng);
-        std::memcpy(&d, &b, sizeof d);
-      } while (std::isnan(d));
-    }
+    double v[4];  // any bits but NaN's
+    for (double& d : v)
+      while (std::isnan(d = std::bit_cast<double>(bits(rng)))) continue;
     Rect r{v[0], v[1], v[2], v[3]};
     ASSERT_EQ(rectFromString(stringFromRect(r)), r) << stringFromRect(r);
   }

@@ -1,12 +1,7 @@
 #include <gtest/gtest.h>
 
-#include <leptonica/allheaders.h>
-#include <unistd.h>
-
 #include <algorithm>
 #include <array>
-#include <cstdio>
-#include <functional>
 #include <regex>
 
 #include "Corvelbase/platform/Files.h"
@@ -84,23 +79,6 @@ TEST(Image, BadSourcesFailWithAReasonInsteadOfAPicture) {
   EXPECT_FALSE(Image::initByReferencingFile(dir.path())->bitmap());
 }
 
-// What a decoding writes to standard error while `decode` runs.
-std::string stderrOf(const std::function<void()>& decode) {
-  std::fflush(stderr);
-  FILE* capture = std::tmpfile();
-  int saved = dup(STDERR_FILENO);
-  dup2(fileno(capture), STDERR_FILENO);
-  decode();
-  std::fflush(stderr);
-  dup2(saved, STDERR_FILENO);
-  close(saved);
-  std::rewind(capture);
-  std::string text;
-  for (int c; (c = std::fgetc(capture)) != EOF;) text += static_cast<char>(c);
-  std::fclose(capture);
-  return text;
-}
-
 // Regression: libjpeg's and Leptonica's TIFF reader's messages went to stderr (thousands of lines
 // in four minutes of fuzzing) instead of into the failure reason.
 TEST(Image, DamagedJpegAndTiffSayWhyInTheReasonNotOnStderr) {
@@ -108,36 +86,13 @@ TEST(Image, DamagedJpegAndTiffSayWhyInTheReasonNotOnStderr) {
       {"truncated.jpg", "JPEG image is corrupt or truncated (JPEG datastream contains no image)"},
       {"truncated.tif", "TIFF image is corrupt or truncated ("}};
   for (const auto& [file, reason] : cases) {
-    std::string why;
-    std::string said = stderrOf([&, file = file] {
-      auto image =
-          Image::initByReferencingFile(testing::fixturePath(std::string("images/") + file));
-      EXPECT_FALSE(image->bitmap()) << file;
-      why = image->failureReason();
-    });
-    EXPECT_EQ(said, "") << file;
+    ::testing::internal::CaptureStderr();
+    auto image = Image::initByReferencingFile(testing::fixturePath(std::string("images/") + file));
+    EXPECT_FALSE(image->bitmap()) << file;
+    EXPECT_EQ(::testing::internal::GetCapturedStderr(), "") << file;
+    std::string why = image->failureReason();
     EXPECT_NE(why.find(reason), std::string::npos) << file << ": " << why;
   }
-}
-
-// Our JPEG reader replaced Leptonica's for the above: the pixels must not change.
-TEST(Image, JpegPixelsMatchLeptonicasReader) {
-  Data jpeg = fixtureBytes("sample.jpg");
-  PIX* theirs = pixReadMem(jpeg.data(), jpeg.size());
-  ASSERT_TRUE(theirs);
-  auto ours = Image::initWithData(jpeg);
-  ASSERT_TRUE(ours);
-  Data rgba = ours->bitmap()->rgba();
-  for (l_int32 y = 0; y < pixGetHeight(theirs); ++y) {
-    for (l_int32 x = 0; x < pixGetWidth(theirs); ++x) {
-      l_int32 r, g, b;
-      pixGetRGBPixel(theirs, x, y, &r, &g, &b);
-      const std::uint8_t* p = &rgba[(static_cast<std::size_t>(y) * 24 + x) * 4];
-      ASSERT_EQ((std::array<int, 3>{p[0], p[1], p[2]}), (std::array<int, 3>{r, g, b}))
-          << x << "," << y;
-    }
-  }
-  pixDestroy(&theirs);
 }
 
 TEST(Image, FileURLsAreReadAndOtherSchemesRefused) {
@@ -177,10 +132,8 @@ TEST(Image, JpegEncodingRoundTripsAndComposesAlphaOverWhite) {
   ASSERT_TRUE(decoded);
   Data back = decoded->bitmap()->rgba();
   EXPECT_NEAR(back[(2 * kSide + 5) * 4], 255, 8);  // transparent rows over white
-  const std::uint8_t* inner = &back[(24 * kSide + 12) * 4];
-  EXPECT_NEAR(inner[0], 10, 12);
-  EXPECT_NEAR(inner[1], 200, 12);
-  EXPECT_NEAR(inner[2], 30, 12);
+  const int inner[] = {10, 200, 30};               // an opaque pixel keeps its colour
+  for (int k = 0; k < 3; ++k) EXPECT_NEAR(back[(24 * kSide + 12) * 4 + k], inner[k], 12) << k;
   EXPECT_FALSE(Bitmap::fromRGBA(0, kSide, rgba.data(), rgba.size()));
   EXPECT_FALSE(Bitmap::fromRGBA(kSide, kSide + 1, rgba.data(), rgba.size()));  // too few bytes
   EXPECT_FALSE(Image::initWithBitmap(nullptr));

@@ -2,8 +2,8 @@
 // lists built to exhaust the parser. Binary lists are assembled here byte by byte.
 #include <gtest/gtest.h>
 
+#include <bit>
 #include <chrono>
-#include <cstring>
 #include <limits>
 
 #include "Corvelbase/platform/KeyedArchive.h"
@@ -15,6 +15,9 @@ namespace {
 
 using Bytes = std::vector<std::uint8_t>;
 
+// Byte `index` of `value`, 0 the lowest.
+std::uint8_t byteOf(std::size_t value, int index) { return std::uint8_t(value >> (8 * index)); }
+
 // A binary property list of `objects` (each its marker and body, references
 // `referenceSize` bytes wide), whose root is the first object. Offsets take two bytes.
 Data bplist(const std::vector<Bytes>& objects, std::uint8_t referenceSize = 1) {
@@ -25,17 +28,11 @@ Data bplist(const std::vector<Bytes>& objects, std::uint8_t referenceSize = 1) {
     out.insert(out.end(), object.begin(), object.end());
   }
   std::size_t table = out.size();
-  for (std::size_t offset : offsets) {
-    out.push_back(static_cast<std::uint8_t>(offset >> 8));
-    out.push_back(static_cast<std::uint8_t>(offset));
-  }
+  for (std::size_t offset : offsets) out.insert(out.end(), {byteOf(offset, 1), byteOf(offset, 0)});
   Data trailer(32, 0);
-  trailer[6] = 2;  // offset size
-  trailer[7] = referenceSize;
-  trailer[15] = static_cast<std::uint8_t>(objects.size());
-  trailer[14] = static_cast<std::uint8_t>(objects.size() >> 8);
-  trailer[31] = static_cast<std::uint8_t>(table);
-  trailer[30] = static_cast<std::uint8_t>(table >> 8);
+  trailer[6] = 2, trailer[7] = referenceSize;  // offset and reference sizes
+  trailer[14] = byteOf(objects.size(), 1), trailer[15] = byteOf(objects.size(), 0);
+  trailer[30] = byteOf(table, 1), trailer[31] = byteOf(table, 0);
   out.insert(out.end(), trailer.begin(), trailer.end());
   return out;
 }
@@ -45,10 +42,7 @@ Data nestedArrays(int levels, int width) {
   std::vector<Bytes> objects;
   for (int i = 0; i < levels; ++i) {
     Bytes array{static_cast<std::uint8_t>(0xA0 | width)};
-    for (int j = 0; j < width; ++j) {
-      array.push_back(static_cast<std::uint8_t>((i + 1) >> 8));
-      array.push_back(static_cast<std::uint8_t>(i + 1));
-    }
+    for (int j = 0; j < width; ++j) array.insert(array.end(), {byteOf(i + 1, 1), byteOf(i + 1, 0)});
     objects.push_back(array);
   }
   objects.push_back({0x10, 7});
@@ -56,8 +50,7 @@ Data nestedArrays(int levels, int width) {
 }
 
 Bytes date(double seconds) {
-  std::uint64_t bits;
-  std::memcpy(&bits, &seconds, 8);
+  auto bits = std::bit_cast<std::uint64_t>(seconds);
   Bytes out{0x33};
   for (int shift = 56; shift >= 0; shift -= 8)
     out.push_back(static_cast<std::uint8_t>(bits >> shift));

@@ -2,7 +2,6 @@
 
 #include <cstdlib>
 #include <filesystem>
-#include <regex>
 
 #include "Corvelbase/platform/Error.h"
 #include "Corvelbase/platform/Files.h"
@@ -39,15 +38,6 @@ TEST(PropertyList, RoundTripsThroughBinaryAndXML) {
   EXPECT_EQ(PropertyList::deserialize(*xml), noUid);
 }
 
-TEST(PropertyList, RejectsWhatIsNoPropertyList) {
-  std::string junk = "not a plist at all";
-  EXPECT_FALSE(PropertyList::deserialize(Data(junk.begin(), junk.end())));
-  auto binary = sampleTree().serialize(PropertyList::Format::Binary);
-  for (std::size_t cut : {std::size_t{0}, std::size_t{8}, binary->size() / 2, binary->size() - 1})
-    EXPECT_FALSE(PropertyList::deserialize(Data(binary->begin(), binary->begin() + cut))) << cut;
-  EXPECT_FALSE(PropertyList().serialize(PropertyList::Format::XML));
-}
-
 TEST(PropertyList, NumberConversionsFollowThePlatformsNumbers) {
   EXPECT_EQ(PropertyList(0.1).floatValue(), 0.1f);
   EXPECT_EQ(PropertyList(std::uint64_t{5000000000}).unsignedIntValue(), 705032704u);
@@ -82,12 +72,6 @@ TEST(Files, CachesDirectoryFollowsTheEnvironmentAndIsCreated) {
   setenv("HOME", home.c_str(), 1);
   EXPECT_EQ(cachesDirectory(), home + "/.cache");
   unsetenv("XDG_CACHE_HOME");
-}
-
-TEST(Files, UUIDsAreCanonicalUpperCaseAndDistinct) {
-  std::string a = makeUUIDString();
-  EXPECT_TRUE(std::regex_match(a, std::regex("[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}"))) << a;
-  EXPECT_NE(a, makeUUIDString());
 }
 
 TEST(Strings, ConversionsReplaceWhatIsNotUnicode) {

@@ -47,9 +47,8 @@ TEST(OperationQueue, DestroyingAQueueDropsWaitingWorkAndReleasesIt) {
     // holding the last reference, is gone): otherwise the worker could start it first.
     std::thread opener([&] {
       auto deadline = std::chrono::steady_clock::now() + 10s;
-      while (!watch.expired() && std::chrono::steady_clock::now() < deadline) {
+      while (!watch.expired() && std::chrono::steady_clock::now() < deadline)
         std::this_thread::yield();
-      }
       open.set_value();
     });
     queue.reset();

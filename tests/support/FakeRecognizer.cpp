@@ -4,66 +4,6 @@
 
 namespace corvel::testing {
 
-void FakeRecognizer::setAvailable(bool available) {
-  std::lock_guard lock(mutex_);
-  available_ = available;
-}
-
-void FakeRecognizer::setObservations(std::vector<RecognizedTextObservation> observations) {
-  std::lock_guard lock(mutex_);
-  observations_ = std::move(observations);
-}
-
-void FakeRecognizer::setSupportedLanguages(std::optional<std::vector<std::string>> codes,
-                                           Error error) {
-  std::lock_guard lock(mutex_);
-  supported_ = std::move(codes);
-  supportedError_ = std::move(error);
-}
-
-void FakeRecognizer::hold() {
-  std::lock_guard lock(mutex_);
-  held_ = true;
-}
-
-void FakeRecognizer::release() {
-  {
-    std::lock_guard lock(mutex_);
-    held_ = false;
-  }
-  changed_.notify_all();
-}
-
-bool FakeRecognizer::waitForRunning(std::size_t count, std::chrono::milliseconds timeout) {
-  std::unique_lock lock(mutex_);
-  return changed_.wait_for(lock, timeout, [&] { return running_ >= count; });
-}
-
-bool FakeRecognizer::waitForRecognitions(std::size_t count, std::chrono::milliseconds timeout) {
-  std::unique_lock lock(mutex_);
-  return changed_.wait_for(lock, timeout, [&] { return requests_.size() >= count; });
-}
-
-std::size_t FakeRecognizer::running() const {
-  std::lock_guard lock(mutex_);
-  return running_;
-}
-
-std::size_t FakeRecognizer::maxRunning() const {
-  std::lock_guard lock(mutex_);
-  return maxRunning_;
-}
-
-std::vector<FakeRecognizer::Recorded> FakeRecognizer::requests() const {
-  std::lock_guard lock(mutex_);
-  return requests_;
-}
-
-std::vector<FakeRecognizer::SupportedQuery> FakeRecognizer::supportedQueries() const {
-  std::lock_guard lock(mutex_);
-  return supportedQueries_;
-}
-
 bool FakeRecognizer::isAvailable() const {
   std::lock_guard lock(mutex_);
   return available_;
@@ -103,11 +43,6 @@ std::optional<std::vector<RecognizedTextObservation>> FakeRecognizer::recognize(
     }
   }
   return observations_;
-}
-
-void FakeRecognizer::setFastMaxLongSide(std::uint32_t side) {
-  std::lock_guard lock(mutex_);
-  fastMaxLongSide_ = side;
 }
 
 std::uint32_t FakeRecognizer::maxUsefulLongSide(const TextRecognitionRequest& request) const {

@@ -34,25 +34,49 @@ class FakeRecognizer final : public TextRecognizer {
     std::int64_t revision;
   };
 
-  void setAvailable(bool available);
-  void setObservations(std::vector<RecognizedTextObservation> observations);
-  void setSupportedLanguages(std::optional<std::vector<std::string>> codes, Error error = {});
+  void setAvailable(bool available) {
+    locked([&] { available_ = available; });
+  }
+  void setObservations(std::vector<RecognizedTextObservation> observations) {
+    locked([&] { observations_ = std::move(observations); });
+  }
+  void setSupportedLanguages(std::optional<std::vector<std::string>> codes, Error error = {}) {
+    locked([&] { supported_ = std::move(codes), supportedError_ = std::move(error); });
+  }
   // The long side the fake asks for fast requests (0, the default: full size).
-  void setFastMaxLongSide(std::uint32_t side);
+  void setFastMaxLongSide(std::uint32_t side) {
+    locked([&] { fastMaxLongSide_ = side; });
+  }
 
   // While held, recognitions wait inside `recognize` until `release`, or until their
   // request is cancelled (they then fail with TextRecognitionErrorCancelled).
-  void hold();
-  void release();
-  // Waits until at least `count` recognitions are inside `recognize`; false on timeout.
-  bool waitForRunning(std::size_t count, std::chrono::milliseconds timeout);
-  // Waits until `count` recognitions have been made; false on timeout.
-  bool waitForRecognitions(std::size_t count, std::chrono::milliseconds timeout);
-  std::size_t running() const;
-  std::size_t maxRunning() const;
-
-  std::vector<Recorded> requests() const;
-  std::vector<SupportedQuery> supportedQueries() const;
+  void hold() {
+    locked([&] { held_ = true; });
+  }
+  void release() {
+    locked([&] { held_ = false; });
+    changed_.notify_all();
+  }
+  // Wait until at least `count` recognitions are inside `recognize`, or have been made;
+  // false on timeout.
+  bool waitForRunning(std::size_t count, std::chrono::milliseconds timeout) {
+    return waitUntil(timeout, [&] { return running_ >= count; });
+  }
+  bool waitForRecognitions(std::size_t count, std::chrono::milliseconds timeout) {
+    return waitUntil(timeout, [&] { return requests_.size() >= count; });
+  }
+  std::size_t running() const {
+    return locked([&] { return running_; });
+  }
+  std::size_t maxRunning() const {
+    return locked([&] { return maxRunning_; });
+  }
+  std::vector<Recorded> requests() const {
+    return locked([&] { return requests_; });
+  }
+  std::vector<SupportedQuery> supportedQueries() const {
+    return locked([&] { return supportedQueries_; });
+  }
 
   bool isAvailable() const override;
   std::optional<std::vector<RecognizedTextObservation>> recognize(
@@ -63,6 +87,16 @@ class FakeRecognizer final : public TextRecognizer {
                                                                         Error* error) override;
 
  private:
+  template <class F>
+  auto locked(F f) const -> decltype(f()) {
+    std::lock_guard lock(mutex_);
+    return f();
+  }
+  template <class P>
+  bool waitUntil(std::chrono::milliseconds timeout, P ready) {
+    std::unique_lock lock(mutex_);
+    return changed_.wait_for(lock, timeout, ready);
+  }
   mutable std::mutex mutex_;
   std::condition_variable changed_;
   bool available_ = true;

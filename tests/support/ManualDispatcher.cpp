@@ -2,11 +2,6 @@
 
 namespace corvel::testing {
 
-void ManualDispatcher::dispatch(std::function<void()> work) {
-  std::lock_guard lock(mutex_);
-  work_.push_back(std::move(work));
-}
-
 std::size_t ManualDispatcher::drain() {
   std::size_t ran = 0;
   for (;;) {
@@ -20,11 +15,6 @@ std::size_t ManualDispatcher::drain() {
     next();
     ++ran;
   }
-}
-
-std::size_t ManualDispatcher::pending() const {
-  std::lock_guard lock(mutex_);
-  return work_.size();
 }
 
 }  // namespace corvel::testing

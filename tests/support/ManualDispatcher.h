@@ -12,11 +12,17 @@ namespace corvel::testing {
 
 class ManualDispatcher final : public MainQueueDispatcher {
  public:
-  void dispatch(std::function<void()> work) override;
+  void dispatch(std::function<void()> work) override {
+    std::lock_guard lock(mutex_);
+    work_.push_back(std::move(work));
+  }
   // Runs what is pending (and what that work dispatches) on the calling thread; returns
   // how many blocks ran.
   std::size_t drain();
-  std::size_t pending() const;
+  std::size_t pending() const {
+    std::lock_guard lock(mutex_);
+    return work_.size();
+  }
 
  private:
   mutable std::mutex mutex_;

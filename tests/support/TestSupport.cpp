@@ -18,13 +18,6 @@ LogCapture::LogCapture() {
   });
 }
 
-LogCapture::~LogCapture() { PlatformRegistry::setLogSink(nullptr); }
-
-std::vector<std::string> LogCapture::lines() const {
-  std::lock_guard lock(mutex_);
-  return lines_;
-}
-
 TempDir::TempDir() {
   std::filesystem::create_directories(CORVEL_TEST_WORK_DIR);
   std::string pattern = std::string(CORVEL_TEST_WORK_DIR) + "/tmp.XXXXXX";
@@ -37,12 +30,8 @@ TempDir::~TempDir() {
   std::filesystem::remove_all(path_, ec);
 }
 
-std::string fixturePath(const std::string& relative) {
-  return std::string(CORVEL_FIXTURES_DIR) + "/" + relative;
-}
-
-std::string fixtureText(const std::string& relative) {
-  auto bytes = readFile(fixturePath(relative));
+std::string fileText(const std::string& path) {
+  auto bytes = readFile(path);
   return bytes ? std::string(bytes->begin(), bytes->end()) : std::string();
 }
 

@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "Corvelbase/platform/Platform.h"
 #include "Corvelbase/platform/String.h"
 
 namespace corvel::testing {
@@ -13,11 +14,14 @@ namespace corvel::testing {
 class LogCapture {
  public:
   LogCapture();
-  ~LogCapture();
+  ~LogCapture() { PlatformRegistry::setLogSink(nullptr); }
   LogCapture(const LogCapture&) = delete;
   LogCapture& operator=(const LogCapture&) = delete;
 
-  std::vector<std::string> lines() const;
+  std::vector<std::string> lines() const {
+    std::lock_guard lock(mutex_);
+    return lines_;
+  }
 
  private:
   mutable std::mutex mutex_;
@@ -40,9 +44,14 @@ class TempDir {
 };
 
 // Path of a committed fixture: tests/fixtures/<relative>.
-std::string fixturePath(const std::string& relative);
-// The bytes of that fixture as a string; empty when it cannot be read.
-std::string fixtureText(const std::string& relative);
+inline std::string fixturePath(const std::string& relative) {
+  return std::string(CORVEL_FIXTURES_DIR) + "/" + relative;
+}
+// The bytes of a file, or of a fixture, as a string; empty when it cannot be read.
+std::string fileText(const std::string& path);
+inline std::string fixtureText(const std::string& relative) {
+  return fileText(fixturePath(relative));
+}
 
 // Runs a shell command, returning its exit status and standard output.
 struct CommandResult {
@@ -50,5 +59,9 @@ struct CommandResult {
   std::string output;
 };
 CommandResult runCommand(const std::string& command);
+// Runs the command-line program with `arguments` (which may redirect its streams).
+inline CommandResult corvel(const std::string& arguments) {
+  return runCommand(std::string(CORVEL_TOOL_PATH) + " " + arguments);
+}
 
 }  // namespace corvel::testing

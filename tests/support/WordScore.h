@@ -10,6 +10,7 @@
 #include <algorithm>
 #include <map>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "support/TextDistance.h"
@@ -17,27 +18,9 @@
 namespace corvel::testing {
 
 inline bool strippable(char32_t c) {
-  if (c == U'$' || c == U'%' || c == U'&' || c == U'@' || c == U'#' || c == U'\u20AC' ||
-      c == U'\u00A3' || c == U'\u00A7') {
+  if (std::u32string_view(U"$%&@#\u20AC\u00A3\u00A7").find(c) != std::u32string_view::npos)
     return false;
-  }
-  std::int8_t type = u_charType(static_cast<UChar32>(c));
-  switch (type) {
-    case U_DASH_PUNCTUATION:
-    case U_START_PUNCTUATION:
-    case U_END_PUNCTUATION:
-    case U_CONNECTOR_PUNCTUATION:
-    case U_OTHER_PUNCTUATION:
-    case U_INITIAL_PUNCTUATION:
-    case U_FINAL_PUNCTUATION:
-    case U_MATH_SYMBOL:
-    case U_CURRENCY_SYMBOL:
-    case U_MODIFIER_SYMBOL:
-    case U_OTHER_SYMBOL:
-      return true;
-    default:
-      return false;
-  }
+  return (U_GET_GC_MASK(static_cast<UChar32>(c)) & (U_GC_P_MASK | U_GC_S_MASK)) != 0;
 }
 
 inline std::vector<std::u32string> words(const std::string& utf8) {

@@ -7,25 +7,16 @@
 #include "Corvelbase/RVRecognitionBlock.h"
 #include "Corvelbase/RVTextLayoutAnalyser.h"
 #include "Corvelbase/platform/Files.h"
+#include "ocr/BlockTestHelpers.h"
 #include "support/TestSupport.h"
 
 namespace corvel {
 namespace {
 
 using nlohmann::json;
+using testing::articleLines;
 
 const std::string kArticle = testing::fixturePath("layout/article.json");
-
-RVBlockArray articleLines() {
-  RVBlockArray lines;
-  for (const json& entry : json::parse(testing::fixtureText("layout/article.json"))) {
-    lines.push_back(RVRecognitionBlock::initWithText(
-        fromUTF8(entry["text"].get<std::string>()),
-        rectFromString(entry["boundingBox"].get<std::string>()), entry["confidence"].get<double>(),
-        static_cast<RVRecognitionBlockLevel>(entry["level"].get<int>())));
-  }
-  return lines;
-}
 
 // A block dictionary whose "childBlocks" nest `levels` deep.
 PropertyList nestedBlocks(int levels) {
@@ -37,6 +28,8 @@ PropertyList nestedBlocks(int levels) {
   }
   return info;
 }
+
+testing::CommandResult layout(const std::string& args) { return testing::corvel("layout " + args); }
 
 // Block trees deeper than the limit used to be cut silently; files from outside are now
 // refused, and `corvel layout` says why.
@@ -52,7 +45,7 @@ TEST(BlockTreeLimit, TreesDeeperThanTheLimitAreRefusedFromFiles) {
     EXPECT_EQ(RVRecognitionBlock::readFromFile(path) != nullptr, levels == kLimit) << levels;
     ASSERT_TRUE(PropertyList(PropertyList::Array{nestedBlocks(levels)})
                     .writeToFile(path, PropertyList::Format::XML));
-    auto run = testing::runCommand(std::string(CORVEL_TOOL_PATH) + " layout '" + path + "' 2>&1");
+    auto run = layout("'" + path + "' 2>&1");
     if (levels == kLimit) {
       // Read, not refused (its blocks hold no text of their own: "found nothing", 1).
       EXPECT_EQ(run.status, 1) << run.output;
@@ -62,10 +55,6 @@ TEST(BlockTreeLimit, TreesDeeperThanTheLimitAreRefusedFromFiles) {
           << run.output;
     }
   }
-}
-
-testing::CommandResult layout(const std::string& args) {
-  return testing::runCommand(std::string(CORVEL_TOOL_PATH) + " layout " + args);
 }
 
 TEST(LayoutCommand, PrintsTheReadingOrderTextOfJSONAndPlistPages) {

@@ -12,8 +12,7 @@ testing::CommandResult md(const std::string& document, const std::string& args) 
   testing::TempDir dir;
   std::string path = dir.file("doc.md");
   EXPECT_TRUE(writeFileAtomically(path, Data(document.begin(), document.end())));
-  return testing::runCommand(std::string(CORVEL_TOOL_PATH) + " md " + args + " < '" + path +
-                             "' 2>/dev/null");
+  return testing::corvel("md " + args + " < '" + path + "' 2>/dev/null");
 }
 
 TEST(MdTool, PrintsTheAnswerAsJSONOrTheEditedDocument) {

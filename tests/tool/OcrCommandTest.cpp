@@ -1,12 +1,12 @@
 // `corvel ocr` on images as a user runs it, and the manners of the whole command line:
 // help, suggestions, misuse, standard input.
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/wait.h>
-#include <unistd.h>
 
-#include <nlohmann/json.hpp>
+#include <fstream>
+#include <regex>
+#include <sstream>
 
 #include "Corvelbase/platform/Image.h"
 #include "support/TestSupport.h"
@@ -17,19 +17,14 @@ namespace {
 
 using testing::characterErrorRate;
 
-std::string fixtureText(const std::string& name) {
-  return testing::fixtureText("ocr/" + name + ".txt");
-}
-
-std::string tool() { return CORVEL_TOOL_PATH; }
 std::string page(const std::string& name) { return testing::fixturePath("ocr/" + name + ".png"); }
 
 TEST(OcrCommand, PrintsEachFilesTextAndReportsTheOneThatFails) {
   testing::TempDir dir;
   std::string errors = dir.file("errors.txt");
-  auto result = testing::runCommand(tool() + " ocr --fast --lang en-US " + page("sample") + " " +
-                                    dir.file("missing.png") + " file://" + page("lines/line-001") +
-                                    " 2>" + errors);
+  auto result =
+      testing::corvel("ocr --fast --lang en-US " + page("sample") + " " + dir.file("missing.png") +
+                      " file://" + page("lines/line-001") + " 2>" + errors);
   EXPECT_EQ(result.status, 1);
   // Headers in the order given; the failed file gets none.
   std::size_t first = result.output.find("==> " + page("sample") + " <==");
@@ -40,25 +35,18 @@ TEST(OcrCommand, PrintsEachFilesTextAndReportsTheOneThatFails) {
   EXPECT_EQ(result.output.find("missing.png"), std::string::npos);
   std::string sampleText = result.output.substr(first, second - first);
   sampleText = sampleText.substr(sampleText.find('\n') + 1);
-  EXPECT_LT(characterErrorRate(fixtureText("sample"), sampleText), 0.02) << sampleText;
-  auto stderrText = testing::runCommand("cat " + errors).output;  // names the file and why
+  EXPECT_LT(characterErrorRate(testing::fixtureText("ocr/sample.txt"), sampleText), 0.02)
+      << sampleText;
+  auto stderrText = testing::fileText(errors);  // names the file and why
   EXPECT_NE(stderrText.find("missing.png"), std::string::npos) << stderrText;
   EXPECT_NE(stderrText.find("cannot be read"), std::string::npos) << stderrText;
 }
 
-TEST(OcrCommand, JsonGivesTheTextAndTheBlockTreeAndTheOverlayIsAPictureOfThePage) {
+TEST(OcrCommand, TheOverlayIsAPictureOfThePage) {
   testing::TempDir dir;
-  auto result = testing::runCommand(tool() + " ocr --json --fast --overlay " +
-                                    dir.file("over.png") + " " + page("two-columns"));
+  auto result =
+      testing::corvel("ocr --fast --overlay " + dir.file("over.png") + " " + page("two-columns"));
   ASSERT_EQ(result.status, 0) << result.output;
-  auto object = nlohmann::json::parse(result.output, nullptr, false);
-  ASSERT_FALSE(object.is_discarded()) << result.output;
-  const auto& file = object["files"][0];
-  EXPECT_EQ(file["file"], page("two-columns"));
-  const auto& first = file["pages"][0];
-  EXPECT_LT(characterErrorRate(fixtureText("two-columns"), first["text"].get<std::string>()), 0.02);
-  // Blocks (the schema is checked in full with the other formats): the two columns.
-  EXPECT_GE(first["blocks"].size(), 2u) << first["blocks"];
   auto overlay = Image::initByReferencingFile(dir.file("over.png"));
   ASSERT_TRUE(overlay->bitmap()) << overlay->failureReason();
   EXPECT_EQ(overlay->size(), Image::initByReferencingFile(page("two-columns"))->size());
@@ -67,39 +55,22 @@ TEST(OcrCommand, JsonGivesTheTextAndTheBlockTreeAndTheOverlayIsAPictureOfThePage
 // Ctrl-C after the first page is out: it stays printed, the rest is reported unread,
 // and the program ends with 130 rather than finishing the batch.
 TEST(OcrCommand, InterruptKeepsWhatIsFinished) {
-  int out[2];
-  ASSERT_EQ(pipe(out), 0);
-  pid_t child = fork();
-  ASSERT_GE(child, 0);
-  if (child == 0) {
-    dup2(out[1], STDOUT_FILENO);
-    dup2(out[1], STDERR_FILENO);
-    close(out[0]);
-    std::string program = tool(), first = page("lines/line-001"), big = page("pages/page-01");
-    std::vector<std::string> args{program, "ocr", "--lang", "en-US", first};
-    for (int i = 0; i < 8; ++i) args.push_back(big);
-    std::vector<char*> argv;
-    for (auto& a : args) argv.push_back(a.data());
-    argv.push_back(nullptr);
-    execv(program.c_str(), argv.data());
-    _exit(127);
-  }
-  close(out[1]);
+  // The shell prints its own id, which the program keeps when the shell becomes it.
+  std::string command =
+      "echo $$; exec " CORVEL_TOOL_PATH " ocr --lang en-US " + page("lines/line-001");
+  for (int i = 0; i < 8; ++i) command += " " + page("pages/page-01");
+  FILE* out = popen((command + " 2>&1").c_str(), "r");
+  ASSERT_TRUE(out);
+  int child = 0;
+  ASSERT_EQ(fscanf(out, "%d", &child), 1);
+  // The first page's header and a line of its text, then the interrupt.
   std::string printed;
-  char buffer[4096];
-  // The first page's header and text, then the interrupt.
-  while (printed.find("\n", printed.find("<==") + 4) == std::string::npos) {
-    ssize_t n = read(out[0], buffer, sizeof buffer);
-    if (n <= 0) break;
-    printed.append(buffer, static_cast<std::size_t>(n));
-  }
+  char line[4096];
+  for (int after = -1; after < 1 && fgets(line, sizeof line, out);)
+    after += (printed += line).find("<==") != std::string::npos;
   kill(child, SIGINT);
-  for (ssize_t n; (n = read(out[0], buffer, sizeof buffer)) > 0;) {
-    printed.append(buffer, static_cast<std::size_t>(n));
-  }
-  close(out[0]);
-  int status = 0;
-  waitpid(child, &status, 0);
+  while (fgets(line, sizeof line, out)) printed += line;
+  int status = pclose(out);
   ASSERT_TRUE(WIFEXITED(status));
   EXPECT_EQ(WEXITSTATUS(status), 130);
   EXPECT_NE(printed.find("==> " + page("lines/line-001") + " <=="), std::string::npos) << printed;
@@ -123,7 +94,6 @@ TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {
     std::string input = "";
   } cases[] = {
       {"--version", 0, "corvel 0.1"},
-      {"help ocr", 0, "usage: corvel ocr"},
       {"ocr --help", 0, "usage: corvel ocr"},
       {"orc x.png", 2, "did you mean 'ocr'"},
       {"ocr --fsat x.png", 2, "did you mean '--fast'"},
@@ -138,7 +108,6 @@ TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {
       {"ocr - -", 2, "standard input"},
       {"ocr", 2, "give at least one file"},
       {"ocr --lang", 2, "--lang"},
-      {"ocr --overlay", 2, "--overlay"},
       // A page past its deadline is reported, and the run counts as partly failed.
       {"ocr --timeout 0.000001 " + page("sample"), 1, "deadline"},
       // Simplified Chinese is the one catalogue entry without fast recognition.
@@ -153,9 +122,39 @@ TEST(OcrCommand, BehavesLikeTheToolsUsersKnow) {
   };
   for (const auto& c : cases) {
     std::string input = c.input.empty() ? "</dev/null" : "<<'EOF'\n" + c.input + "\nEOF";
-    auto result = testing::runCommand(tool() + " " + c.args + " 2>&1 " + input);
+    auto result = testing::corvel(c.args + " 2>&1 " + input);
     EXPECT_EQ(result.status, c.status) << c.args << "\n" << result.output;
     EXPECT_NE(result.output.find(c.says), std::string::npos) << c.args << "\n" << result.output;
+  }
+}
+
+// Regression: the library's log line ("Error: Error Domain=...") from a job's worker thread
+// landed on stderr in the middle of corvel's own message about the same failure. Two hundred
+// failing inputs made that happen several times a run; every line must now be whole, and
+// each failure is one line (the library's own log lines only come with --verbose).
+TEST(ToolLog, LibraryLogLinesNeverSplitTheProgramsMessages) {
+  testing::TempDir dir;
+  std::string inputs;
+  for (int i = 0; i < 200; ++i) {
+    std::string name = "junk" + std::to_string(i) + ".png";
+    std::ofstream(dir.file(name)) << "not a picture";
+    inputs += " '" + dir.file(name) + "'";
+  }
+  for (std::string verbose : {"", " --verbose"}) {
+    auto run = testing::corvel("ocr" + verbose + inputs + " 2>&1 >/dev/null");
+    EXPECT_EQ(run.status, 2);  // no input could be read
+    const std::regex whole(
+        "Error: Error Domain=.*\\}|corvel: .*junk[0-9]+\\.png: cannot be read: .*");
+    std::istringstream lines(run.output);
+    int count = 0, messages = 0;
+    for (std::string line; std::getline(lines, line); ++count) {
+      EXPECT_TRUE(std::regex_match(line, whole)) << line;
+      messages += line.rfind("corvel: ", 0) == 0;
+    }
+    EXPECT_EQ(messages, 200) << verbose;
+    if (verbose.empty()) {
+      EXPECT_EQ(count, 200);
+    }
   }
 }
 

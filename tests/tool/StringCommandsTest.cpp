@@ -7,13 +7,6 @@
 namespace corvel {
 namespace {
 
-// `corvel ARGUMENTS` (which may redirect standard input): its exit status and standard output.
-struct CommandCase {
-  std::string arguments;
-  int status;
-  std::string output;
-};
-
 // A file `name` in `dir` holding `text`, its path quoted for the shell.
 std::string file(const testing::TempDir& dir, const std::string& name, const std::string& text) {
   std::ofstream(dir.file(name)) << text;
@@ -30,7 +23,12 @@ TEST(StringCommands, UtiLangAndHeaderPrintTheAnswerOrExitWithWhy) {
   std::string bad = file(dir, "bad.txt", "\xff\xfe\x80 \xc3"), missing = "'" + dir.file("no") + "'";
   std::string mail =
       file(dir, "m.eml", "From: Ada Lovelace <ada@example.com>\r\nSubject: Grüße\r\n\r\nBody\r\n");
-  const CommandCase cases[] = {
+  // `corvel ARGUMENTS` (which may redirect standard input): its exit status and standard output.
+  const struct {
+    std::string arguments;
+    int status;
+    std::string output;
+  } cases[] = {
       // uti: the type, then everything it conforms to.
       {"uti public.png", 0, "public.png\npublic.image\npublic.data\npublic.content\npublic.item\n"},
       {"uti " + notes, 0,
@@ -52,9 +50,8 @@ TEST(StringCommands, UtiLangAndHeaderPrintTheAnswerOrExitWithWhy) {
       {"header From " + mail + " extra", 2, ""},
       {"header From " + missing, 2, ""},
   };
-  for (const CommandCase& c : cases) {
-    testing::CommandResult result =
-        testing::runCommand(std::string(CORVEL_TOOL_PATH) + " " + c.arguments + " 2>/dev/null");
+  for (const auto& c : cases) {
+    auto result = testing::corvel(c.arguments + " 2>/dev/null");
     EXPECT_EQ(result.status, c.status) << c.arguments;
     EXPECT_EQ(result.output, c.output) << c.arguments;
   }
