@@ -34,6 +34,15 @@ class CORVEL_EXPORT Bitmap {
   // size, a size beyond the pixel budget, or fewer bytes than width * height * 4.
   static std::shared_ptr<Bitmap> fromRGBA(std::uint32_t width, std::uint32_t height,
                                           const std::uint8_t* rgba, std::size_t size);
+  // A bitmap of 8-bit pixels with 1 (grey), 3 (RGB) or 4 (RGBA) channels, rows top to
+  // bottom `bytesPerRow` apart: a row may be followed by padding, as in a view of part of
+  // a larger picture or an array with aligned rows. `size` is the bytes readable from
+  // `pixels`. The pixels are read once, straight into the bitmap (grey stays one byte a
+  // pixel). nullptr for another channel count, a zero size, a size beyond the pixel
+  // budget, a row stride shorter than a row, or fewer bytes than the rows need.
+  static std::shared_ptr<Bitmap> fromPixels(std::uint32_t width, std::uint32_t height, int channels,
+                                            const std::uint8_t* pixels, std::size_t bytesPerRow,
+                                            std::size_t size);
 
   explicit Bitmap(std::unique_ptr<Native> native);
   ~Bitmap();
@@ -64,6 +73,12 @@ class CORVEL_EXPORT Image {
   static std::shared_ptr<Image> initByReferencingURL(const std::string& url);
   // An image decoded now from encoded bytes; nullptr when they are no decodable image.
   static std::shared_ptr<Image> initWithData(const Data& data);
+  // An image that decodes `data` (the bytes of an image file) when its bitmap is first
+  // asked for, as a file-backed image does: on the worker of a job, reduced while it is
+  // decoded where a reader needs no more. The image keeps the bytes (not the caller's
+  // buffer: they are moved in). Always an object: bytes that are no decodable image show
+  // up as a null bitmap() with a failureReason().
+  static std::shared_ptr<Image> initByReferencingData(Data data);
   // An image holding `bitmap`; nullptr for a null bitmap.
   static std::shared_ptr<Image> initWithBitmap(std::shared_ptr<Bitmap> bitmap);
 
@@ -98,8 +113,9 @@ class CORVEL_EXPORT Image {
   Image() = default;
   void decode() const;
 
-  std::string path_;         // file to decode lazily, when not empty
-  std::string sourceError_;  // a failure known before decoding (an unsupported URL)
+  std::string path_;          // file to decode lazily, when not empty
+  std::optional<Data> data_;  // encoded bytes to decode lazily; never changed once set
+  std::string sourceError_;   // a failure known before decoding (an unsupported URL)
   mutable std::once_flag decodeOnce_;
   mutable std::atomic<bool> decoded_{false};
   mutable std::mutex knownSizeMutex_;

@@ -234,21 +234,39 @@ std::uint32_t Bitmap::height() const {
 
 std::shared_ptr<Bitmap> Bitmap::fromRGBA(std::uint32_t width, std::uint32_t height,
                                          const std::uint8_t* rgba, std::size_t size) {
-  if (!rgba || !withinBudget(width, height) ||
-      size / 4 / width < height) {  // written to avoid overflow
+  if (!withinBudget(width, height)) return nullptr;
+  return fromPixels(width, height, 4, rgba, std::size_t{width} * 4, size);
+}
+
+std::shared_ptr<Bitmap> Bitmap::fromPixels(std::uint32_t width, std::uint32_t height, int channels,
+                                           const std::uint8_t* pixels, std::size_t bytesPerRow,
+                                           std::size_t size) {
+  if (!pixels || (channels != 1 && channels != 3 && channels != 4) ||
+      !withinBudget(width, height)) {
     return nullptr;
   }
-  PIX* pix = pixCreate(static_cast<l_int32>(width), static_cast<l_int32>(height), 32);
+  // Within the budget a row and the whole picture fit in 64 bits; the stride is the
+  // caller's, so the last row's end is checked without overflowing.
+  std::size_t row = std::size_t{width} * static_cast<std::size_t>(channels);
+  if (bytesPerRow < row || size < row || (size - row) / bytesPerRow < std::size_t{height} - 1) {
+    return nullptr;
+  }
+  PIX* pix = createPagePix(width, height, channels == 1 ? 8 : 32);
   if (!pix) return nullptr;
-  pixSetSpp(pix, 4);
+  if (channels != 1) pixSetSpp(pix, channels);
   l_uint32* data = pixGetData(pix);
-  l_int32 wpl = pixGetWpl(pix);
+  std::size_t wpl = static_cast<std::size_t>(pixGetWpl(pix));
   for (std::uint32_t y = 0; y < height; ++y) {
-    l_uint32* line = data + static_cast<std::size_t>(y) * static_cast<std::size_t>(wpl);
-    const std::uint8_t* src = rgba + static_cast<std::size_t>(y) * width * 4;
-    for (std::uint32_t x = 0; x < width; ++x, src += 4) {
-      line[x] = (static_cast<l_uint32>(src[0]) << 24) | (static_cast<l_uint32>(src[1]) << 16) |
-                (static_cast<l_uint32>(src[2]) << 8) | src[3];
+    l_uint32* line = data + y * wpl;
+    const std::uint8_t* src = pixels + y * bytesPerRow;
+    if (channels == 1) {
+      packGreyRow(line, src, width);
+    } else if (channels == 3) {
+      for (std::uint32_t x = 0; x < width; ++x, src += 3) {
+        line[x] = (l_uint32{src[0]} << 24) | (l_uint32{src[1]} << 16) | (l_uint32{src[2]} << 8);
+      }
+    } else {
+      for (std::uint32_t x = 0; x < width; ++x, src += 4) line[x] = bigEndian32(src);
     }
   }
   return std::make_shared<Bitmap>(std::make_unique<Native>(pix));
@@ -333,6 +351,12 @@ std::shared_ptr<Image> Image::initWithData(const Data& data) {
   return initWithBitmap(std::move(bitmap));
 }
 
+std::shared_ptr<Image> Image::initByReferencingData(Data data) {
+  std::shared_ptr<Image> image(new Image);
+  image->data_ = std::move(data);
+  return image;
+}
+
 std::shared_ptr<Image> Image::initWithBitmap(std::shared_ptr<Bitmap> bitmap) {
   if (!bitmap) return nullptr;
   std::shared_ptr<Image> image(new Image);
@@ -345,6 +369,10 @@ void Image::decode() const {
   std::call_once(decodeOnce_, [this] {
     if (!sourceError_.empty()) {
       failure_ = sourceError_;
+      return;
+    }
+    if (data_) {
+      bitmap_ = decodeBytes(*data_, &failure_);
       return;
     }
     auto bytes = readFile(path_);
@@ -364,12 +392,13 @@ std::shared_ptr<Bitmap> Image::bitmap() const {
 }
 
 std::shared_ptr<Bitmap> Image::bitmapFittingLongSide(std::uint32_t maxLongSide) const {
-  if (maxLongSide == 0 || decoded_.load(std::memory_order_acquire) || path_.empty()) {
+  if (maxLongSide == 0 || decoded_.load(std::memory_order_acquire) || (path_.empty() && !data_)) {
     return reducedBitmap(bitmap(), maxLongSide);
   }
   // Not decoded yet: decode reduced, and keep nothing, so that the full-size pixels are
   // never held. A failure is left for bitmap() and failureReason() to find and keep.
-  auto bytes = readFile(path_);
+  std::optional<Data> read = data_ ? std::nullopt : readFile(path_);
+  const Data* bytes = data_ ? &*data_ : read ? &*read : nullptr;
   std::string failure;
   Size fullSize;
   auto reduced = bytes ? decodeBytes(*bytes, &failure, maxLongSide, &fullSize) : nullptr;
