@@ -263,7 +263,8 @@ std::shared_ptr<Bitmap> Bitmap::fromPixels(std::uint32_t width, std::uint32_t he
       packGreyRow(line, src, width);
     } else if (channels == 3) {
       for (std::uint32_t x = 0; x < width; ++x, src += 3) {
-        line[x] = (l_uint32{src[0]} << 24) | (l_uint32{src[1]} << 16) | (l_uint32{src[2]} << 8);
+        line[x] =
+            (l_uint32{src[0]} << 24) | (l_uint32{src[1]} << 16) | (l_uint32{src[2]} << 8) | 0xff;
       }
     } else {
       for (std::uint32_t x = 0; x < width; ++x, src += 4) line[x] = bigEndian32(src);

@@ -9,37 +9,34 @@
 namespace corvel::python {
 
 void bindTypes(py::module_& m) {
-  auto& registry = TypeRegistry::shared();
-  m.def("type_conforms_to", [&registry](const std::string& type, const std::string& parent) {
-    return registry.conformsTo(type, parent);
-  });
-  m.def("type_for_extension", [&registry](const std::string& extension) {
-    return registry.typeForFilenameExtension(extension);
+  m.def("type_for_extension", [](const std::string& extension) {
+    return TypeRegistry::shared().typeForFilenameExtension(extension);
   });
   m.def("type_for_mime_type",
-        [&registry](const std::string& mime) { return registry.typeForMIMEType(mime); });
-  m.def("type_preferred_extension",
-        [&registry](const std::string& type) { return registry.preferredFilenameExtension(type); });
+        [](const std::string& mime) { return TypeRegistry::shared().typeForMIMEType(mime); });
+  m.def("type_preferred_extension", [](const std::string& type) {
+    return TypeRegistry::shared().preferredFilenameExtension(type);
+  });
   m.def("type_preferred_mime_type",
-        [&registry](const std::string& type) { return registry.preferredMIMEType(type); });
+        [](const std::string& type) { return TypeRegistry::shared().preferredMIMEType(type); });
   m.def("type_supertypes",
-        [&registry](const std::string& type) { return registry.supertypes(type); });
-  m.def("type_declaration", [&registry](const std::string& type) -> py::object {
-    auto declaration = registry.declaration(type);
+        [](const std::string& type) { return TypeRegistry::shared().supertypes(type); });
+  m.def("type_declaration", [](const std::string& type) -> py::object {
+    auto declaration = TypeRegistry::shared().declaration(type);
     if (!declaration) return py::none();
     return py::make_tuple(declaration->identifier, declaration->conformsTo,
                           declaration->filenameExtensions, declaration->mimeTypes,
                           declaration->description);
   });
   m.def("type_declare",
-        [&registry](const std::string& identifier, const std::vector<std::string>& conformsTo,
-                    const std::vector<std::string>& extensions,
-                    const std::vector<std::string>& mimeTypes, const std::string& description) {
-          return registry.declare(
+        [](const std::string& identifier, const std::vector<std::string>& conformsTo,
+           const std::vector<std::string>& extensions, const std::vector<std::string>& mimeTypes,
+           const std::string& description) {
+          return TypeRegistry::shared().declare(
               TypeDeclaration{identifier, conformsTo, extensions, mimeTypes, description});
         });
   m.def("type_load_declarations",
-        [&registry](const std::string& path) { return registry.loadDeclarations(path); });
+        [](const std::string& path) { return TypeRegistry::shared().loadDeclarations(path); });
   m.def(
       "type_of_file", [](const std::string& path) { return typeOfFile(path); },
       py::call_guard<py::gil_scoped_release>());
@@ -53,8 +50,6 @@ void bindTypes(py::module_& m) {
   });
   m.def("uti_is_dynamic", [](const py::str& uti) { return UTI::isDynamicUTI(toString(uti)); });
   m.def("uti_is_rtf_kind", [](const py::str& uti) { return UTI::isRTFKindUTI(toString(uti)); });
-  m.def("uti_valid",
-        [](const py::str& uti) { return fromString(UTI::validUTIString(toString(uti))); });
 
   py::dict constants;
   const std::pair<const char*, std::u16string_view> named[] = {

@@ -1,0 +1,186 @@
+# Recognition through the module: every kind of source gives the text the file gives,
+# results carry the page's geometry, failures arrive as exceptions of their kind, and
+# jobs run side by side and stop when cancelled.
+import concurrent.futures
+import difflib
+import os
+import time
+
+import numpy
+import pytest
+from PIL import Image
+
+import corvelbase
+from corvelbase import _corvelbase as native
+from conftest import OCR
+
+SAMPLE = OCR / "sample.png"
+
+
+def similarity(a, b):
+    return difflib.SequenceMatcher(None, a.split(), b.split()).ratio()
+
+
+@pytest.fixture(scope="module")
+def sample_text():
+    return corvelbase.ocr(SAMPLE, languages="en-US").text
+
+
+@pytest.fixture(scope="module")
+def rgb():
+    return numpy.asarray(Image.open(SAMPLE).convert("RGB"))
+
+
+# Each source carries the same pixels, so each must read exactly as the file does.
+@pytest.mark.parametrize("make", [
+    lambda rgb: SAMPLE.as_uri(),
+    lambda rgb: SAMPLE.read_bytes(),
+    lambda rgb: memoryview(bytearray(SAMPLE.read_bytes())),
+    lambda rgb: rgb,
+    lambda rgb: numpy.dstack([rgb, numpy.full(rgb.shape[:2], 255, numpy.uint8)]),
+    # Rows apart (a crop of a wider picture), read in place.
+    lambda rgb: numpy.pad(rgb, ((0, 0), (0, 7), (0, 0)))[:, :rgb.shape[1]],
+    # Each pixel's channels apart: packed into a copy first.
+    lambda rgb: numpy.asfortranarray(rgb),
+], ids=["file-url", "bytes", "bytearray-view", "rgb", "rgba", "row-padded", "fortran-order"])
+def test_every_source_reads_as_the_file_does(make, rgb, sample_text):
+    assert corvelbase.ocr(make(rgb), languages=["en-US"]).text == sample_text
+
+
+def test_grey_pixels_read_like_the_file():
+    grey = numpy.asarray(Image.open(SAMPLE).convert("L"))
+    expected = (OCR / "sample.txt").read_text()
+    assert similarity(corvelbase.ocr(grey, languages="en-US").text, expected) > 0.9
+
+
+@pytest.mark.parametrize("layout, accepted", [
+    ("row-padded", True), ("flipped", False), ("fortran", False), ("channels-apart", False)])
+def test_pixels_are_read_in_place_only_when_rows_are_packed(rgb, layout, accepted):
+    array = {"row-padded": numpy.pad(rgb, ((0, 0), (0, 3), (0, 0)))[:, :rgb.shape[1]],
+             "flipped": rgb[::-1], "fortran": numpy.asfortranarray(rgb),
+             "channels-apart": rgb[:, :, ::-1]}[layout]
+    try:
+        native.submit_pixels(array, native.JobOptions(), lambda *outcome: None).stop()
+    except ValueError:
+        assert not accepted
+    else:
+        assert accepted
+
+
+@pytest.mark.parametrize("order, levels", [
+    ("layout", {corvelbase.Level.COLUMN, corvelbase.Level.PARAGRAPH, corvelbase.Level.LINE}),
+    ("engine", {corvelbase.Level.COLUMN, corvelbase.Level.PARAGRAPH, corvelbase.Level.LINE}),
+])
+def test_results_carry_the_page_tree_in_reading_order(order, levels):
+    result = corvelbase.ocr(SAMPLE, languages="en-US", order=order)
+    page, = result.pages
+    assert page.size == Image.open(SAMPLE).size
+    assert {block.level for top in page.blocks for block in top.walk()} == levels
+    # The lines, in order, are the text's lines.
+    position = 0
+    for line in page.lines:
+        position = result.text.index(line.text, position)
+        assert 0 < line.confidence <= 100
+        left, top, right, bottom = line.box.to_pixels(*page.size)
+        assert 0 <= left < right <= page.size[0] and 0 <= top < bottom <= page.size[1]
+    # The heading comes first and stands above every other line, in pixels too.
+    heading, *rest = page.lines
+    assert heading.text == "A Sample Page in Two Columns"
+    assert all(heading.box.to_pixels(*page.size)[3] <= line.box.to_pixels(*page.size)[1]
+               for line in rest)
+
+
+def test_layout_analysis_of_the_lines_gives_the_job_its_text():
+    result = corvelbase.ocr(SAMPLE, languages="en-US", order="layout")
+    again = corvelbase.analyse_layout(
+        (line.text, (line.box.x, line.box.y, line.box.width, line.box.height), line.confidence)
+        for line in result.lines)
+    assert again.text == result.text
+    assert [b.text for b in again.blocks] == [b.text for b in result.pages[0].blocks]
+
+
+def broken_engine(tmp_path):
+    (tmp_path / "eng.traineddata").write_bytes(b"not a model")
+    corvelbase.configure_engine(data_path=str(tmp_path))
+
+
+def no_models(tmp_path):
+    corvelbase.configure_engine(data_path=str(tmp_path))
+
+
+# One row per kind of failure: what causes it, and the exception, domain and code.
+@pytest.mark.parametrize("source, options, setup, kind, code", [
+    (b"\x89PNG\r\n\x1a\n but not really", {}, None, corvelbase.ImageUnreadableError,
+     native.ERROR_IMAGE_UNREADABLE),
+    (OCR / "missing.png", {}, None, corvelbase.ImageUnreadableError,
+     native.ERROR_IMAGE_UNREADABLE),
+    (numpy.zeros((0, 5), numpy.uint8), {}, None, corvelbase.ImageUnreadableError,
+     native.ERROR_IMAGE_UNREADABLE),
+    (SAMPLE, {"languages": ["xx-XX"]}, None, corvelbase.UnsupportedLanguageError,
+     native.ERROR_UNSUPPORTED_LANGUAGE),
+    (OCR / "pages" / "page-01.png", {"timeout": 0.05}, None, corvelbase.RecognitionTimeoutError,
+     native.ERROR_TIMED_OUT),
+    (SAMPLE, {"languages": "en-US"}, broken_engine, corvelbase.EngineError,
+     native.ERROR_ENGINE_FAILURE),
+    (SAMPLE, {}, no_models, corvelbase.UnsupportedSystemError, native.ERROR_UNSUPPORTED_SYSTEM),
+], ids=["undecodable-bytes", "missing-file", "no-pixels", "language", "timeout", "engine",
+        "no-recogniser"])
+def test_each_failure_raises_its_kind(tmp_path, source, options, setup, kind, code):
+    if setup:
+        setup(tmp_path)
+    try:
+        with pytest.raises(kind) as raised:
+            corvelbase.ocr(source, **options)
+    finally:
+        corvelbase.configure_engine()
+    error = raised.value
+    assert error.code == code and error.reason
+    assert error.domain == (native.OCR_DOMAIN if code == native.ERROR_UNSUPPORTED_SYSTEM
+                            else native.RECOGNITION_DOMAIN)
+    assert isinstance(error, corvelbase.Error)
+
+
+@pytest.mark.parametrize("call, kind", [
+    (lambda: corvelbase.ocr(3.5), TypeError),
+    (lambda: corvelbase.ocr(numpy.zeros((4, 4), numpy.float32)), TypeError),
+    (lambda: corvelbase.ocr(numpy.zeros((4, 4, 2), numpy.uint8)), ValueError),
+    (lambda: corvelbase.ocr(SAMPLE, level="quick"), ValueError),
+    (lambda: corvelbase.ocr(SAMPLE, order="columns"), ValueError),
+    (lambda: corvelbase.ocr(SAMPLE, timeout=0), ValueError),
+])
+def test_misuse_is_refused_before_anything_runs(call, kind):
+    with pytest.raises(kind):
+        call()
+
+
+def timed(function):
+    start = time.monotonic()
+    function()
+    return time.monotonic() - start
+
+
+@pytest.mark.skipif((os.cpu_count() or 1) < 2, reason="needs two cores")
+def test_two_threads_finish_faster_than_one_after_the_other():
+    pages = [OCR / "two-columns.png", OCR / "one-column.png"]
+    read = lambda page: corvelbase.ocr(page, languages="en-US")  # noqa: E731
+    read(pages[0])  # the engines are started
+    serial = timed(lambda: [read(page) for page in pages])
+    with concurrent.futures.ThreadPoolExecutor(2) as pool:
+        parallel = timed(lambda: list(pool.map(read, pages)))
+    assert parallel < 0.8 * serial
+
+
+def test_cancel_stops_waiting_and_running_jobs():
+    small = OCR / "one-column.png"
+    corvelbase.ocr(small, level="fast")
+    big = sorted((OCR / "pages").glob("*.png"))[:6]
+    futures = [corvelbase.submit(page, languages="en-US", level="fast") for page in big]
+    assert all(future.cancel() for future in futures)
+    assert all(future.cancelled() for future in futures)
+    with pytest.raises(concurrent.futures.CancelledError):
+        futures[0].result(timeout=0)
+    # The queue runs six jobs at once: had the six big pages run on, the next page would
+    # wait for the first of them to be read.
+    after = timed(lambda: corvelbase.ocr(small, level="fast"))
+    one_big_page = timed(lambda: corvelbase.ocr(big[0], languages="en-US", level="fast"))
+    assert after < one_big_page / 2
