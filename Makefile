@@ -49,6 +49,9 @@ tsan: deps
 bench: build
 	@for b in $(RELEASE_DIR)/bench/bench_*; do \
 	  [ -x "$$b" ] || continue; echo "== $$b"; "$$b" || exit 1; done
+	@echo "== bench/python_paths.py"
+	PYTHONPATH=$(RELEASE_DIR)/python /usr/bin/python3 bench/python_paths.py \
+	  --corvel $(RELEASE_DIR)/tools/corvel/corvel
 
 # The demo needs only the library and the program, not the test suites.
 demo: deps

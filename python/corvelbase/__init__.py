@@ -17,6 +17,7 @@ from dataclasses import dataclass
 from typing import Iterable
 
 from . import _corvelbase as _native
+from . import markdown, uti
 from ._jobs import OcrFuture, Source, ocr, submit
 from .errors import (EngineError, Error, ImageUnreadableError, NoRecognizerError,
                      RecognitionCancelledError, RecognitionTimeoutError,
@@ -30,7 +31,7 @@ __all__ = [
     "UnsupportedSystemError", "Language", "languages", "is_valid_language_combination",
     "supports_fast_recognition", "order_languages", "configure_engine", "engine_statistics",
     "release_idle_engines", "analyse_layout", "dominant_language", "header_value",
-    "contains_asian_characters",
+    "contains_asian_characters", "markdown", "uti",
 ]
 
 # Stops running jobs and lets the library's threads out of the interpreter before it

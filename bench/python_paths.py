@@ -1,0 +1,133 @@
+#!/usr/bin/env python3
+"""OCR of one batch of real pages three ways, in one run: `corvel ocr`, the Python module
+with a thread pool, and corvelbase.distributed.ocr_many on a LocalCluster of two worker
+processes. Prints pages per minute, each path's time against `corvel ocr` (its
+overhead), peak memory (per worker for Dask), and whether every path read the same text.
+
+Each path runs in a process of its own, started and timed the same way, so its time
+takes in the interpreter, the imports and the engines' start-up as `corvel ocr` takes in
+its own; Dask's line also gives the time of ocr_many alone, without the cluster's
+start-up, which a long collection pays once. Rounds take the paths in turn (rotated each
+round) and the median of each path is reported.
+
+Usage: bench/python_paths.py [--corpus DIR] [--corvel PATH] [--threads N] [--rounds N]
+                             [--level accurate|fast]
+(PYTHONPATH must reach the built package: `make bench` sets it.)
+"""
+import argparse
+import json
+import os
+import statistics
+import subprocess
+import sys
+import time
+from pathlib import Path
+
+ROOT = Path(__file__).resolve().parents[1]
+
+MODULE = r"""
+import concurrent.futures, json, sys
+import corvelbase
+paths, threads, level = json.loads(sys.argv[1]), int(sys.argv[2]), sys.argv[3]
+read = lambda p: corvelbase.ocr(p, level=level).text
+with concurrent.futures.ThreadPoolExecutor(threads) as pool:
+    texts = list(pool.map(read, paths))
+json.dump({"texts": texts}, sys.stdout)
+"""
+
+DASK = r"""
+import json, resource, sys, tempfile, time
+from pathlib import Path
+from dask.distributed import Client, LocalCluster
+from corvelbase.distributed import ocr_many
+paths, level = json.loads(sys.argv[1]), sys.argv[3]
+started = time.monotonic()
+with LocalCluster(n_workers=2, threads_per_worker=1, processes=True,
+                  dashboard_address=None) as cluster, Client(cluster) as client:
+    up = time.monotonic()
+    with tempfile.TemporaryDirectory() as out:
+        report = ocr_many(paths, out, client, level=level)
+        done = time.monotonic()
+        texts = [(Path(out) / (Path(p).stem + ".txt")).read_text() for p in paths]
+    peak = client.run(lambda: resource.getrusage(resource.RUSAGE_SELF).ru_maxrss)
+json.dump({"texts": texts, "startup": up - started, "ocr_many": done - up,
+           "failed": len(report.failed), "worker_peak_kib": sorted(peak.values())}, sys.stdout)
+"""
+
+
+def run(command):
+    """(wall seconds, peak resident KiB, stdout) of a child process."""
+    started = time.monotonic()
+    child = subprocess.Popen(command, stdout=subprocess.PIPE)
+    out = child.stdout.read()
+    _, status, usage = os.wait4(child.pid, 0)
+    wall = time.monotonic() - started
+    if os.waitstatus_to_exitcode(status) != 0:
+        sys.exit(f"{command[0]} failed with status {status}")
+    return wall, usage.ru_maxrss, out
+
+
+def corvel_path(args, pages):
+    command = [args.corvel, "ocr", "--json"] + (["--fast"] if args.level == "fast" else [])
+    wall, peak, out = run(command + [str(p) for p in pages])
+    texts = [json.loads(line)["text"] for line in out.decode().splitlines()]
+    return {"wall": wall, "peak_kib": peak, "texts": texts}
+
+
+def python_path(script, args, pages):
+    wall, peak, out = run([sys.executable, "-c", script, json.dumps([str(p) for p in pages]),
+                           str(args.threads), args.level])
+    return {"wall": wall, "peak_kib": peak, **json.loads(out)}
+
+
+def main():
+    parser = argparse.ArgumentParser(description=__doc__.splitlines()[0])
+    parser.add_argument("--corpus", default="/work/shared/ocr-corpus/images",
+                        help="a folder of real page images (outside the repository)")
+    parser.add_argument("--corvel", default=str(ROOT / "build/release/tools/corvel/corvel"))
+    parser.add_argument("--threads", type=int, default=6,
+                        help="the module's thread pool (default: the jobs the shared queue "
+                             "runs at once, as `corvel ocr` queues every page)")
+    parser.add_argument("--rounds", type=int, default=1)
+    parser.add_argument("--level", choices=["accurate", "fast"], default="accurate")
+    args = parser.parse_args()
+
+    pages = sorted(Path(args.corpus).glob("*.png")) if Path(args.corpus).is_dir() else []
+    if not pages:
+        print(f"(no pages in {args.corpus}; the repository's pages only)")
+    pages += sorted((ROOT / "tests/fixtures/ocr/pages").glob("*.png"))
+
+    paths = {
+        "corvel ocr": lambda: corvel_path(args, pages),
+        f"module, {args.threads} threads": lambda: python_path(MODULE, args, pages),
+        "ocr_many, LocalCluster 2x1": lambda: python_path(DASK, args, pages),
+    }
+    names = list(paths)
+    runs = {name: [] for name in names}
+    for round_ in range(args.rounds):
+        for name in names[round_ % 3:] + names[:round_ % 3]:
+            runs[name].append(paths[name]())
+
+    print(f"{len(pages)} pages ({args.level}), {args.rounds} round(s), {os.cpu_count()} cores")
+    reference = statistics.median(r["wall"] for r in runs["corvel ocr"])
+    texts = runs["corvel ocr"][0]["texts"]
+    for name in names:
+        wall = statistics.median(r["wall"] for r in runs[name])
+        last = runs[name][-1]
+        same = sum(a == b for a, b in zip(last["texts"], texts))
+        line = (f"{name:28} {len(pages) / wall * 60:6.1f} pages/min  {wall:7.1f} s  "
+                f"{(wall / reference - 1) * 100:+6.1f}% vs corvel  "
+                f"peak {last['peak_kib'] / 1024:6.0f} MiB  same text {same}/{len(pages)}")
+        if "ocr_many" in last:
+            alone = statistics.median(r["ocr_many"] for r in runs[name])
+            workers = ", ".join(f"{kib / 1024:.0f}" for kib in last["worker_peak_kib"])
+            line += (f"\n{'':28} ocr_many alone {alone:.1f} s "
+                     f"({(alone / reference - 1) * 100:+.1f}% vs corvel), cluster start-up "
+                     f"{statistics.median(r['startup'] for r in runs[name]):.1f} s, "
+                     f"peak per worker {workers} MiB (driver {last['peak_kib'] / 1024:.0f} MiB), "
+                     f"failed pages {last['failed']}")
+        print(line)
+
+
+if __name__ == "__main__":
+    main()
