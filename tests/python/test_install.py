@@ -19,7 +19,8 @@ def test_installed_package_imports_from_the_prefix(tmp_path):
         [sys.executable, "-c", "import corvelbase, corvelbase.distributed;"
          "print(corvelbase.__file__);"
          "print(corvelbase.markdown.set_header('Title', 1, (0, 0)).text)"],
-        env={**env, "PYTHONPATH": str(site)}, check=True, capture_output=True, text=True)
+        env={**env, "PYTHONPATH": str(site)}, cwd=tmp_path, check=True, capture_output=True,
+        text=True)
     location, header = out.stdout.splitlines()
     assert location.startswith(str(site)) and header == "# "
     assert (site / "corvelbase" / "_corvelbase.pyi").exists()

@@ -161,26 +161,25 @@ def timed(function):
 
 @pytest.mark.skipif((os.cpu_count() or 1) < 2, reason="needs two cores")
 def test_two_threads_finish_faster_than_one_after_the_other():
-    pages = [OCR / "two-columns.png", OCR / "one-column.png"]
+    pages = [OCR / f"{name}.png" for name in ("two-columns", "one-column", "sample", "german")]
     read = lambda page: corvelbase.ocr(page, languages="en-US")  # noqa: E731
-    read(pages[0])  # the engines are started
-    serial = timed(lambda: [read(page) for page in pages])
     with concurrent.futures.ThreadPoolExecutor(2) as pool:
+        list(pool.map(read, pages[:2]))  # two engines are started
+        serial = timed(lambda: [read(page) for page in pages])
         parallel = timed(lambda: list(pool.map(read, pages)))
     assert parallel < 0.8 * serial
 
 
 def test_cancel_stops_waiting_and_running_jobs():
-    small = OCR / "one-column.png"
-    corvelbase.ocr(small, level="fast")
-    big = sorted((OCR / "pages").glob("*.png"))[:6]
-    futures = [corvelbase.submit(page, languages="en-US", level="fast") for page in big]
+    big = sorted((OCR / "pages").glob("*.png"))
+    one_big_page = timed(lambda: corvelbase.ocr(big[0], languages="en-US"))
+    # Twelve pages: the queue starts six, the other six wait for it.
+    futures = [corvelbase.submit(page, languages="en-US") for page in big + big[:2]]
     assert all(future.cancel() for future in futures)
     assert all(future.cancelled() for future in futures)
     with pytest.raises(concurrent.futures.CancelledError):
         futures[0].result(timeout=0)
-    # The queue runs six jobs at once: had the six big pages run on, the next page would
-    # wait for the first of them to be read.
-    after = timed(lambda: corvelbase.ocr(small, level="fast"))
-    one_big_page = timed(lambda: corvelbase.ocr(big[0], languages="en-US", level="fast"))
-    assert after < one_big_page / 2
+    # Had the running pages gone on, the next page would wait for three pages' reading
+    # on each core; had the waiting ones run too, for six.
+    after = timed(lambda: corvelbase.ocr(OCR / "one-column.png", languages="en-US"))
+    assert after < 2 * one_big_page
