@@ -217,7 +217,10 @@ std::shared_ptr<Bitmap> bitmapOf(const py::buffer& buffer, std::string* failure)
   return bitmap;
 }
 
-bool isFileURL(const std::string& text) { return text.rfind("file:", 0) == 0; }
+// As the command line tells them apart: a URL names its scheme.
+bool isURL(const std::string& text) {
+  return text.find("://") != std::string::npos || text.rfind("file:", 0) == 0;
+}
 
 // Property-list values as Python values (catalogue entries and the like).
 py::object toPython(const PropertyList& value) {
@@ -296,7 +299,7 @@ void bindOcr(py::module_& m) {
 
   m.def("submit_path", [](const std::string& path, const JobOptions& options, py::object callback) {
     auto image =
-        isFileURL(path) ? Image::initByReferencingURL(path) : Image::initByReferencingFile(path);
+        isURL(path) ? Image::initByReferencingURL(path) : Image::initByReferencingFile(path);
     return start(std::move(image), options, std::move(callback));
   });
   m.def("submit_data", [](py::handle data, const JobOptions& options, py::object callback) {
