@@ -50,8 +50,10 @@ with LocalCluster(n_workers=2, threads_per_worker=1, processes=True,
         done = time.monotonic()
         texts = [(Path(out) / (Path(p).stem + ".txt")).read_text() for p in paths]
     peak = client.run(lambda: resource.getrusage(resource.RUSAGE_SELF).ru_maxrss)
+# The driver's own peak: the one the parent sees also counts the workers, its children.
 json.dump({"texts": texts, "startup": up - started, "ocr_many": done - up,
-           "failed": len(report.failed), "worker_peak_kib": sorted(peak.values())}, sys.stdout)
+           "failed": len(report.failed), "worker_peak_kib": sorted(peak.values()),
+           "driver_peak_kib": resource.getrusage(resource.RUSAGE_SELF).ru_maxrss}, sys.stdout)
 """
 
 
@@ -91,6 +93,7 @@ def main():
     parser.add_argument("--rounds", type=int, default=1)
     parser.add_argument("--level", choices=["accurate", "fast"], default="accurate")
     args = parser.parse_args()
+    load = os.getloadavg()[0]  # other work on the machine skews every path alike only so far
 
     pages = sorted(Path(args.corpus).glob("*.png")) if Path(args.corpus).is_dir() else []
     if not pages:
@@ -108,15 +111,17 @@ def main():
         for name in names[round_ % 3:] + names[:round_ % 3]:
             runs[name].append(paths[name]())
 
-    print(f"{len(pages)} pages ({args.level}), {args.rounds} round(s), {os.cpu_count()} cores")
+    print(f"{len(pages)} pages ({args.level}), {args.rounds} round(s), {os.cpu_count()} cores, "
+          f"load average at the start {load:.1f}")
     reference = statistics.median(r["wall"] for r in runs["corvel ocr"])
     texts = runs["corvel ocr"][0]["texts"]
     for name in names:
         wall = statistics.median(r["wall"] for r in runs[name])
         last = runs[name][-1]
         same = sum(a == b for a, b in zip(last["texts"], texts))
-        line = (f"{name:28} {len(pages) / wall * 60:6.1f} pages/min  {wall:7.1f} s  "
-                f"{(wall / reference - 1) * 100:+6.1f}% vs corvel  "
+        rounds = "/".join(f"{r['wall']:.1f}" for r in runs[name])
+        line = (f"{name:28} {len(pages) / wall * 60:6.1f} pages/min  {wall:7.1f} s "
+                f"(rounds {rounds})  {(wall / reference - 1) * 100:+6.1f}% vs corvel  "
                 f"peak {last['peak_kib'] / 1024:6.0f} MiB  same text {same}/{len(pages)}")
         if "ocr_many" in last:
             alone = statistics.median(r["ocr_many"] for r in runs[name])
@@ -124,7 +129,7 @@ def main():
             line += (f"\n{'':28} ocr_many alone {alone:.1f} s "
                      f"({(alone / reference - 1) * 100:+.1f}% vs corvel), cluster start-up "
                      f"{statistics.median(r['startup'] for r in runs[name]):.1f} s, "
-                     f"peak per worker {workers} MiB (driver {last['peak_kib'] / 1024:.0f} MiB), "
+                     f"peak per worker {workers} MiB (driver {last['driver_peak_kib'] / 1024:.0f} MiB), "
                      f"failed pages {last['failed']}")
         print(line)
 
