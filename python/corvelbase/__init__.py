@@ -1,12 +1,15 @@
-"""Corvelbase for Python: OCR of images on the Tesseract engine with our own layout
-analysis, Markdown editing commands, and string utilities.
+"""Corvelbase for Python: OCR of images and documents (PDF, multi-page TIFF) on the
+Tesseract engine with our own layout analysis, Markdown editing commands, and string
+utilities.
 
     >>> import corvelbase
     >>> corvelbase.ocr("page.png", languages=["en-US"]).text
+    >>> corvelbase.ocr("scan.pdf").save("scan-searchable.pdf")
 
-:func:`ocr` recognises one image and waits; :func:`submit` returns a
+:func:`ocr` recognises an image or a document and waits; :func:`submit` returns a
 ``concurrent.futures.Future`` at once, so many pages run together on the library's
-shared queue (the GIL is released while the engine works). ``corvelbase.distributed``
+shared queue (the GIL is released while the engine works). :func:`write` writes
+results as text, JSON, hOCR, ALTO, TSV or a searchable PDF. ``corvelbase.distributed``
 runs OCR over collections on a Dask cluster; ``corvelbase.markdown`` has the editing
 commands and ``corvelbase.uti`` the type identifiers.
 """
@@ -19,16 +22,21 @@ from typing import Iterable
 from . import _corvelbase as _native
 from . import markdown, uti
 from ._jobs import OcrFuture, Source, ocr, submit
-from .errors import (EngineError, Error, ImageUnreadableError, NoRecognizerError,
-                     RecognitionCancelledError, RecognitionTimeoutError,
-                     UnsupportedLanguageError, UnsupportedSystemError)
-from .results import Block, Box, Level, Page, Result, block_from_tuple
+from .errors import (DocumentDamagedError, DocumentEncryptedError, DocumentUnreadableError,
+                     EngineError, Error, ImageUnreadableError, NoRecognizerError,
+                     PageRangeError, RecognitionCancelledError, RecognitionTimeoutError,
+                     UnreadableError, UnsupportedLanguageError, UnsupportedSystemError,
+                     WriteError)
+from .results import (FORMATS, Block, Box, Level, Page, Result, Word, block_from_tuple, render,
+                      write)
 
 __all__ = [
-    "ocr", "submit", "OcrFuture", "Source", "Result", "Page", "Block", "Box", "Level",
-    "Error", "ImageUnreadableError", "UnsupportedLanguageError", "EngineError",
-    "NoRecognizerError", "RecognitionTimeoutError", "RecognitionCancelledError",
-    "UnsupportedSystemError", "Language", "languages", "is_valid_language_combination",
+    "ocr", "submit", "OcrFuture", "Source", "Result", "Page", "Block", "Word", "Box",
+    "Level", "write", "render", "FORMATS",
+    "Error", "UnreadableError", "ImageUnreadableError", "DocumentUnreadableError",
+    "DocumentDamagedError", "DocumentEncryptedError", "PageRangeError", "WriteError",
+    "UnsupportedLanguageError", "EngineError", "NoRecognizerError", "RecognitionTimeoutError",
+    "RecognitionCancelledError", "UnsupportedSystemError", "Language", "languages", "is_valid_language_combination",
     "supports_fast_recognition", "order_languages", "configure_engine", "engine_statistics",
     "release_idle_engines", "analyse_layout", "dominant_language", "header_value",
     "contains_asian_characters", "markdown", "uti",

@@ -11,33 +11,51 @@ ERROR_NO_RECOGNIZER: int
 ERROR_TIMED_OUT: int
 ERROR_CANCELLED: int
 ERROR_UNSUPPORTED_SYSTEM: int
+DOCUMENT_DOMAIN: str
+ERROR_DOCUMENT_UNREADABLE: int
+ERROR_DOCUMENT_DAMAGED: int
+ERROR_DOCUMENT_ENCRYPTED: int
+ERROR_PAGE_RANGE: int
+ERROR_WRITE: int
 READING_ORDER_LAYOUT: int
 READING_ORDER_ENGINE: int
 READING_ORDER_ROWS: int
 TYPE_CONSTANTS: dict[str, str]
 
 BoxTuple = tuple[float, float, float, float]
-# (text, box, confidence, level, children)
-BlockTuple = tuple[str, BoxTuple, float, int, tuple[Any, ...]]
+# (text, box, confidence)
+WordTuple = tuple[str, BoxTuple, float]
+# (text, box, confidence, level, children, words)
+BlockTuple = tuple[str, BoxTuple, float, int, tuple[Any, ...], tuple[WordTuple, ...]]
 ErrorTuple = tuple[str, int, str, str]
-Deliver = Callable[[str, tuple[float, float], tuple[BlockTuple, ...], Optional[ErrorTuple]], None]
+# (index, (width, height), resolution, text, has own text, blocks, error)
+PageTuple = tuple[int, tuple[float, float], float, str, bool, tuple[BlockTuple, ...],
+                  Optional[ErrorTuple]]
+Deliver = Callable[[Outcome, tuple[PageTuple, ...], Optional[ErrorTuple]], None]
 Span = tuple[int, int]
 EditTuple = tuple[str, Span, Optional[Span]]
 
 class Job:
     def stop(self) -> None: ...
 
+class Outcome:
+    """What a finished job leaves for the writers (opaque)."""
+
 class JobOptions:
     languages: list[str]
     fast: bool
     order: int
     timeout: float
+    force_ocr: bool
+    name: str
     def __init__(self) -> None: ...
 
 def submit_path(path: bytes, options: JobOptions, callback: Deliver) -> Job: ...
 def submit_data(data: Any, options: JobOptions, callback: Deliver) -> Job: ...
 def submit_pixels(pixels: Any, options: JobOptions, callback: Deliver) -> Job: ...
 def shutdown() -> None: ...
+def write(outcomes: list[Outcome], path: bytes, format: str) -> Optional[ErrorTuple]: ...
+def render(outcomes: list[Outcome], format: str) -> str: ...
 def configure_engine(data_path: str, concurrency: int, idle_model_bytes: int,
                      fast_max_long_side: int, seconds_per_megapixel: float,
                      min_timeout: float) -> None: ...

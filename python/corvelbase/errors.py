@@ -10,9 +10,11 @@ import concurrent.futures
 
 from . import _corvelbase as _native
 
-#: The recognition service's error domain, and the job's own (no recognition here).
+#: The recognition service's error domain, the job's own (no recognition here), and
+#: the documents' (opening, reading and writing them).
 RECOGNITION_DOMAIN: str = _native.RECOGNITION_DOMAIN
 OCR_DOMAIN: str = _native.OCR_DOMAIN
+DOCUMENT_DOMAIN: str = _native.DOCUMENT_DOMAIN
 
 
 class Error(Exception):
@@ -33,8 +35,32 @@ class Error(Exception):
         return (_rebuild, (self.domain, self.code, self.reason, self.description))
 
 
-class ImageUnreadableError(Error):
-    """No image, or bytes, pixels or a file that cannot be decoded."""
+class UnreadableError(Error):
+    """The source cannot be read; its subclasses say how."""
+
+
+class ImageUnreadableError(UnreadableError):
+    """Pixels without area, or a picture the engine could not decode."""
+
+
+class DocumentUnreadableError(UnreadableError):
+    """No such file, or one that is neither a PDF nor an image that can be read."""
+
+
+class DocumentDamagedError(UnreadableError):
+    """A PDF or TIFF (or a page of one) too broken to read."""
+
+
+class DocumentEncryptedError(UnreadableError):
+    """A PDF that needs a password."""
+
+
+class PageRangeError(Error, IndexError):
+    """No such page."""
+
+
+class WriteError(Error, OSError):
+    """An output that could not be made or written."""
 
 
 class UnsupportedLanguageError(Error, ValueError):
@@ -69,6 +95,11 @@ _KINDS = {
     (RECOGNITION_DOMAIN, _native.ERROR_TIMED_OUT): RecognitionTimeoutError,
     (RECOGNITION_DOMAIN, _native.ERROR_CANCELLED): RecognitionCancelledError,
     (OCR_DOMAIN, _native.ERROR_UNSUPPORTED_SYSTEM): UnsupportedSystemError,
+    (DOCUMENT_DOMAIN, _native.ERROR_DOCUMENT_UNREADABLE): DocumentUnreadableError,
+    (DOCUMENT_DOMAIN, _native.ERROR_DOCUMENT_DAMAGED): DocumentDamagedError,
+    (DOCUMENT_DOMAIN, _native.ERROR_DOCUMENT_ENCRYPTED): DocumentEncryptedError,
+    (DOCUMENT_DOMAIN, _native.ERROR_PAGE_RANGE): PageRangeError,
+    (DOCUMENT_DOMAIN, _native.ERROR_WRITE): WriteError,
 }
 
 

@@ -1,16 +1,23 @@
 // What the parts of the Python glue share: text and position conversions between
-// Python strings and the library's UTF-16, and the gate that keeps the library's
-// threads out of the interpreter once it is shutting down.
+// Python strings and the library's UTF-16, results and errors as tuples, and the gate
+// that keeps the library's threads out of the interpreter once it is shutting down.
 #pragma once
 
 #include <pybind11/pybind11.h>
 
 #include <condition_variable>
 #include <cstdint>
+#include <memory>
 #include <mutex>
+#include <optional>
 #include <string_view>
+#include <vector>
 
+#include "Corvelbase/RVRecognitionBlock.h"
+#include "Corvelbase/platform/Error.h"
+#include "Corvelbase/platform/Files.h"
 #include "Corvelbase/platform/String.h"
+#include "Corvelbase/platform/TextRecognizer.h"
 
 namespace corvel::python {
 
@@ -66,7 +73,22 @@ class Reference {
   PyObject* object_;
 };
 
+// Results as the package's Python files read them: a box is (x, y, width, height); a
+// block is (text, box, confidence, level, children, words) with the words of a line as
+// (text, box, confidence), confidences in percent; an error is (domain, code, reason,
+// description) or None. The words of a tree's lines are found among `observations`
+// (the lines the tree was made of), when given.
+py::tuple boxTuple(const Rect& box);
+py::tuple treeTuple(const std::shared_ptr<RVBlockArray>& blocks,
+                    const std::vector<RecognizedTextObservation>* observations = nullptr);
+py::object errorTuple(const std::optional<Error>& error);
+
+// The bytes of any buffer that is one contiguous run of bytes (bytes, bytearray,
+// memoryview, mmap, a contiguous array), copied with the GIL released.
+Data bytesOf(py::handle buffer);
+
 void bindOcr(py::module_& module);
+void bindJobs(py::module_& module);
 void bindText(py::module_& module);
 void bindTypes(py::module_& module);
 

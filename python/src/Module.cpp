@@ -135,6 +135,7 @@ void Reference::reset() {
 PYBIND11_MODULE(_corvelbase, module) {
   module.doc() = "The compiled part of corvelbase; use the corvelbase package instead.";
   corvel::python::bindOcr(module);
+  corvel::python::bindJobs(module);
   corvel::python::bindText(module);
   corvel::python::bindTypes(module);
 }

@@ -8,6 +8,7 @@ import pytest
 FIXTURES = Path(os.environ.get("CORVEL_FIXTURES_DIR",
                                Path(__file__).resolve().parents[1] / "fixtures"))
 OCR = FIXTURES / "ocr"
+DOCUMENTS = FIXTURES / "documents"
 
 
 @pytest.fixture(scope="session")

@@ -1,5 +1,6 @@
 # OCR of a batch on a two-worker LocalCluster: a run stopped halfway and run again
-# writes every page once, redoes none, and reports the page that cannot be read.
+# writes every input once in each format, redoes none, and reports the input that
+# cannot be read.
 import json
 import shutil
 import time
@@ -10,9 +11,10 @@ distributed = pytest.importorskip("distributed")
 
 import corvelbase
 from corvelbase.distributed import ocr_many
-from conftest import OCR
+from conftest import DOCUMENTS, OCR
 
 OPTIONS = {"languages": ["en-US"], "level": "fast"}
+FORMATS = ("txt", "hocr")
 
 
 class Stop(Exception):
@@ -36,6 +38,8 @@ def test_a_stopped_run_finishes_on_the_next_without_redoing_pages(client, tmp_pa
     for name in ["sample", "one-column", "two-columns", "french", "german", "photographed"]:
         pages.append(tmp_path / f"{name}.png")
         shutil.copy(OCR / f"{name}.png", pages[-1])
+    pages.append(tmp_path / "pages.tif")  # a document of two pages
+    shutil.copy(DOCUMENTS / "pages.tif", pages[-1])
     broken = tmp_path / "broken.png"
     broken.write_bytes(b"\x89PNG\r\n\x1a\n and nothing more")
     out = tmp_path / "out"
@@ -48,14 +52,16 @@ def test_a_stopped_run_finishes_on_the_next_without_redoing_pages(client, tmp_pa
             raise Stop
 
     with pytest.raises(Stop):
-        ocr_many(pages + [broken], out, client, on_page=stop_after_two, **OPTIONS)
+        ocr_many(pages + [broken], out, client, on_page=stop_after_two, formats=FORMATS,
+                 **OPTIONS)
     # Pages already running when the run stopped still land; wait for them.
     while any(client.run(executing).values()):
         time.sleep(0.1)
-    first = {p.name: (p.stat().st_ino, p.stat().st_mtime_ns) for p in out.glob("*.txt")}
-    assert 2 <= len(first) < len(pages)
+    first = {p.name: (p.stat().st_ino, p.stat().st_mtime_ns) for p in out.glob("*.*")
+             if p.suffix != ".json"}
+    assert 2 <= len(first) // len(FORMATS) < len(pages)
 
-    report = ocr_many(pages + [broken], out, client, **OPTIONS)
+    report = ocr_many(pages + [broken], out, client, formats=FORMATS, **OPTIONS)
 
     written_first = {p for p in pages if f"{p.stem}.txt" in first}
     assert set(map(str, written_first)) == set(report.skipped)
@@ -63,11 +69,15 @@ def test_a_stopped_run_finishes_on_the_next_without_redoing_pages(client, tmp_pa
     for name, identity in first.items():  # untouched: not rewritten by the second run
         stat = (out / name).stat()
         assert (stat.st_ino, stat.st_mtime_ns) == identity
-    for page in pages:  # every page, as this process reads it
-        assert (out / f"{page.stem}.txt").read_text() == corvelbase.ocr(page, **OPTIONS).text
+    for page in pages:  # every input in every format, as this process reads it
+        result = corvelbase.ocr(page, **OPTIONS)
+        for format in FORMATS:
+            assert (out / f"{page.stem}.{format}").read_text() == corvelbase.render(result, format)
     failure, = report.failed
-    assert (failure.path, failure.code) == (str(broken), corvelbase._corvelbase.ERROR_IMAGE_UNREADABLE)
-    assert json.loads((out / "broken.error.json").read_text())["reason"] == failure.reason
+    assert (failure.path, failure.code) == (str(broken),
+                                            corvelbase._corvelbase.ERROR_DOCUMENT_UNREADABLE)
+    errors = json.loads((out / "broken.error.json").read_text())["errors"]
+    assert [error["reason"] for error in errors] == [failure.reason]
     assert not list(out.glob(".*"))  # no temporary file left behind
 
 

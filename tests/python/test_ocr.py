@@ -1,10 +1,11 @@
 # Recognition through the module: every kind of source gives the text the file gives,
-# results carry the page's geometry, failures arrive as exceptions of their kind, and
-# jobs run side by side and stop when cancelled.
+# results carry the page's geometry and words, failures arrive as exceptions of their
+# kind, and jobs run side by side and stop when cancelled.
 import concurrent.futures
 import difflib
 import os
 import resource
+import subprocess
 import time
 
 import numpy
@@ -13,7 +14,7 @@ from PIL import Image
 
 import corvelbase
 from corvelbase import _corvelbase as native
-from conftest import OCR
+from conftest import DOCUMENTS, OCR
 
 SAMPLE = OCR / "sample.png"
 
@@ -68,22 +69,29 @@ def test_pixels_are_read_in_place_only_when_rows_are_packed(rgb, layout, accepte
         assert accepted
 
 
-@pytest.mark.parametrize("order, levels", [
-    ("layout", {corvelbase.Level.COLUMN, corvelbase.Level.PARAGRAPH, corvelbase.Level.LINE}),
-    ("engine", {corvelbase.Level.COLUMN, corvelbase.Level.PARAGRAPH, corvelbase.Level.LINE}),
-])
-def test_results_carry_the_page_tree_in_reading_order(order, levels):
+def inside(inner, outer, slack=1e-9):
+    return (outer.x - slack <= inner.x and inner.x + inner.width <= outer.x + outer.width + slack
+            and outer.y - slack <= inner.y
+            and inner.y + inner.height <= outer.y + outer.height + slack)
+
+
+@pytest.mark.parametrize("order", ["layout", "engine", "rows"])
+def test_results_carry_the_page_tree_in_reading_order(order):
     result = corvelbase.ocr(SAMPLE, languages="en-US", order=order)
     page, = result.pages
     assert page.size == Image.open(SAMPLE).size
-    assert {block.level for top in page.blocks for block in top.walk()} == levels
-    # The lines, in order, are the text's lines.
+    assert {block.level for top in page.blocks for block in top.walk()} == set(corvelbase.Level)
+    # The lines, in order, are the text's lines, each holding its own words (lines the
+    # layout analysis joined side by side hold the words of both).
     position = 0
     for line in page.lines:
         position = result.text.index(line.text, position)
         assert 0 < line.confidence <= 100
         left, top, right, bottom = line.box.to_pixels(*page.size)
         assert 0 <= left < right <= page.size[0] and 0 <= top < bottom <= page.size[1]
+        assert [word.text for word in line.words] == line.text.split()
+        assert all(inside(word.box, line.box) and 0 < word.confidence <= 100
+                   for word in line.words)
     # The heading comes first and stands above every other line, in pixels too.
     heading, *rest = page.lines
     assert heading.text == "A Sample Page in Two Columns"
@@ -109,35 +117,55 @@ def no_models(tmp_path):
     corvelbase.configure_engine(data_path=str(tmp_path))
 
 
+def encrypted(tmp_path):
+    path = tmp_path / "locked.pdf"
+    subprocess.run(["qpdf", "--encrypt", "user", "owner", "256", "--", DOCUMENTS / "scan.pdf",
+                    path], check=True)
+    return path
+
+
+def unwritable(tmp_path):
+    # Read, then written where no folder is.
+    corvelbase.ocr(SAMPLE, languages="en-US", level="fast").save(tmp_path / "none" / "a.txt")
+
+
+RECOGNITION, OCR_DOMAIN, DOCUMENT = (native.RECOGNITION_DOMAIN, native.OCR_DOMAIN,
+                                     native.DOCUMENT_DOMAIN)
+
+
 # One row per kind of failure: what causes it, and the exception, domain and code.
-@pytest.mark.parametrize("source, options, setup, kind, code", [
-    (b"\x89PNG\r\n\x1a\n but not really", {}, None, corvelbase.ImageUnreadableError,
+@pytest.mark.parametrize("source, options, setup, kind, domain, code", [
+    (b"\x89PNG\r\n\x1a\n but not really", {}, None, corvelbase.DocumentUnreadableError,
+     DOCUMENT, native.ERROR_DOCUMENT_UNREADABLE),
+    (OCR / "missing.png", {}, None, corvelbase.DocumentUnreadableError, DOCUMENT,
+     native.ERROR_DOCUMENT_UNREADABLE),
+    (b"%PDF-", {}, None, corvelbase.DocumentDamagedError, DOCUMENT, native.ERROR_DOCUMENT_DAMAGED),
+    (encrypted, {}, None, corvelbase.DocumentEncryptedError, DOCUMENT,
+     native.ERROR_DOCUMENT_ENCRYPTED),
+    (numpy.zeros((0, 5), numpy.uint8), {}, None, corvelbase.ImageUnreadableError, RECOGNITION,
      native.ERROR_IMAGE_UNREADABLE),
-    (OCR / "missing.png", {}, None, corvelbase.ImageUnreadableError,
-     native.ERROR_IMAGE_UNREADABLE),
-    (numpy.zeros((0, 5), numpy.uint8), {}, None, corvelbase.ImageUnreadableError,
-     native.ERROR_IMAGE_UNREADABLE),
-    (SAMPLE, {"languages": ["xx-XX"]}, None, corvelbase.UnsupportedLanguageError,
+    (SAMPLE, {"languages": ["xx-XX"]}, None, corvelbase.UnsupportedLanguageError, RECOGNITION,
      native.ERROR_UNSUPPORTED_LANGUAGE),
     (OCR / "pages" / "page-01.png", {"timeout": 0.05}, None, corvelbase.RecognitionTimeoutError,
-     native.ERROR_TIMED_OUT),
-    (SAMPLE, {"languages": "en-US"}, broken_engine, corvelbase.EngineError,
+     RECOGNITION, native.ERROR_TIMED_OUT),
+    (SAMPLE, {"languages": "en-US"}, broken_engine, corvelbase.EngineError, RECOGNITION,
      native.ERROR_ENGINE_FAILURE),
-    (SAMPLE, {}, no_models, corvelbase.UnsupportedSystemError, native.ERROR_UNSUPPORTED_SYSTEM),
-], ids=["undecodable-bytes", "missing-file", "no-pixels", "language", "timeout", "engine",
-        "no-recogniser"])
-def test_each_failure_raises_its_kind(tmp_path, source, options, setup, kind, code):
-    if setup:
-        setup(tmp_path)
+    (SAMPLE, {}, no_models, corvelbase.UnsupportedSystemError, OCR_DOMAIN,
+     native.ERROR_UNSUPPORTED_SYSTEM),
+    (None, {}, unwritable, corvelbase.WriteError, DOCUMENT, native.ERROR_WRITE),
+], ids=["undecodable-bytes", "missing-file", "damaged-pdf", "encrypted-pdf", "no-pixels",
+        "language", "timeout", "engine", "no-recogniser", "unwritable-output"])
+def test_each_failure_raises_its_kind(tmp_path, source, options, setup, kind, domain, code):
     try:
         with pytest.raises(kind) as raised:
-            corvelbase.ocr(source, **options)
+            if setup:
+                setup(tmp_path)
+            if source is not None:
+                corvelbase.ocr(source(tmp_path) if callable(source) else source, **options)
     finally:
         corvelbase.configure_engine()
     error = raised.value
-    assert error.code == code and error.reason
-    assert error.domain == (native.OCR_DOMAIN if code == native.ERROR_UNSUPPORTED_SYSTEM
-                            else native.RECOGNITION_DOMAIN)
+    assert (error.domain, error.code) == (domain, code) and error.reason
     assert isinstance(error, corvelbase.Error)
 
 
@@ -148,6 +176,9 @@ def test_each_failure_raises_its_kind(tmp_path, source, options, setup, kind, co
     (lambda: corvelbase.ocr(SAMPLE, level="quick"), ValueError),
     (lambda: corvelbase.ocr(SAMPLE, order="columns"), ValueError),
     (lambda: corvelbase.ocr(SAMPLE, timeout=0), ValueError),
+    (lambda: corvelbase.ocr("https://example.org/page.png"), ValueError),
+    (lambda: corvelbase.render([], "docx"), ValueError),
+    (lambda: corvelbase.write([], "out.docx"), ValueError),
 ])
 def test_misuse_is_refused_before_anything_runs(call, kind):
     with pytest.raises(kind):
@@ -187,8 +218,9 @@ def test_two_threads_finish_faster_than_one_after_the_other():
 def test_cancel_stops_waiting_and_running_jobs():
     big = sorted((OCR / "pages").glob("*.png"))
     one_big_page = timed(lambda: corvelbase.ocr(big[0], languages="en-US"))
-    # Twelve pages: the queue starts six, the other six wait for it.
-    futures = [corvelbase.submit(page, languages="en-US") for page in big + big[:2]]
+    # Fourteen pages, two of them a PDF's: the queue starts six, the others wait for it.
+    sources = big + big[:2] + [DOCUMENTS / "scan.pdf"]
+    futures = [corvelbase.submit(source, languages="en-US") for source in sources]
     assert all(future.cancel() for future in futures)
     assert all(future.cancelled() for future in futures)
     with pytest.raises(concurrent.futures.CancelledError):
