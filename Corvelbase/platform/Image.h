@@ -73,12 +73,6 @@ class CORVEL_EXPORT Image {
   static std::shared_ptr<Image> initByReferencingURL(const std::string& url);
   // An image decoded now from encoded bytes; nullptr when they are no decodable image.
   static std::shared_ptr<Image> initWithData(const Data& data);
-  // An image that decodes `data` (the bytes of an image file) when its bitmap is first
-  // asked for, as a file-backed image does: on the worker of a job, reduced while it is
-  // decoded where a reader needs no more. The image keeps the bytes (not the caller's
-  // buffer: they are moved in). Always an object: bytes that are no decodable image show
-  // up as a null bitmap() with a failureReason().
-  static std::shared_ptr<Image> initByReferencingData(Data data);
   // An image holding `bitmap`; nullptr for a null bitmap.
   static std::shared_ptr<Image> initWithBitmap(std::shared_ptr<Bitmap> bitmap);
 
@@ -113,9 +107,8 @@ class CORVEL_EXPORT Image {
   Image() = default;
   void decode() const;
 
-  std::string path_;          // file to decode lazily, when not empty
-  std::optional<Data> data_;  // encoded bytes to decode lazily; never changed once set
-  std::string sourceError_;   // a failure known before decoding (an unsupported URL)
+  std::string path_;         // file to decode lazily, when not empty
+  std::string sourceError_;  // a failure known before decoding (an unsupported URL)
   mutable std::once_flag decodeOnce_;
   mutable std::atomic<bool> decoded_{false};
   mutable std::mutex knownSizeMutex_;

@@ -352,12 +352,6 @@ std::shared_ptr<Image> Image::initWithData(const Data& data) {
   return initWithBitmap(std::move(bitmap));
 }
 
-std::shared_ptr<Image> Image::initByReferencingData(Data data) {
-  std::shared_ptr<Image> image(new Image);
-  image->data_ = std::move(data);
-  return image;
-}
-
 std::shared_ptr<Image> Image::initWithBitmap(std::shared_ptr<Bitmap> bitmap) {
   if (!bitmap) return nullptr;
   std::shared_ptr<Image> image(new Image);
@@ -370,10 +364,6 @@ void Image::decode() const {
   std::call_once(decodeOnce_, [this] {
     if (!sourceError_.empty()) {
       failure_ = sourceError_;
-      return;
-    }
-    if (data_) {
-      bitmap_ = decodeBytes(*data_, &failure_);
       return;
     }
     auto bytes = readFile(path_);
@@ -393,13 +383,12 @@ std::shared_ptr<Bitmap> Image::bitmap() const {
 }
 
 std::shared_ptr<Bitmap> Image::bitmapFittingLongSide(std::uint32_t maxLongSide) const {
-  if (maxLongSide == 0 || decoded_.load(std::memory_order_acquire) || (path_.empty() && !data_)) {
+  if (maxLongSide == 0 || decoded_.load(std::memory_order_acquire) || path_.empty()) {
     return reducedBitmap(bitmap(), maxLongSide);
   }
   // Not decoded yet: decode reduced, and keep nothing, so that the full-size pixels are
   // never held. A failure is left for bitmap() and failureReason() to find and keep.
-  std::optional<Data> read = data_ ? std::nullopt : readFile(path_);
-  const Data* bytes = data_ ? &*data_ : read ? &*read : nullptr;
+  auto bytes = readFile(path_);
   std::string failure;
   Size fullSize;
   auto reduced = bytes ? decodeBytes(*bytes, &failure, maxLongSide, &fullSize) : nullptr;
