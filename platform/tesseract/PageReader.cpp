@@ -220,6 +220,10 @@ bool PageReader::recognisePass(const Page& page, const std::string& models,
   watch.stop = Stop::None;
   watch.maxWords = maxWordsFor(page.pix);
   auto recognise = [&](tesseract::TessBaseAPI& api) {
+    // Asked once before the engine starts: its monitor is first called after the page's
+    // layout analysis, which a request cancelled (or past its deadline) while it waited
+    // for a free engine would otherwise run to the end.
+    if (Watch::shouldStop(&watch, 0)) return false;
     api.SetPageSegMode(settings.singleBlock ? tesseract::PSM_SINGLE_BLOCK : tesseract::PSM_AUTO);
     api.SetVariable("thresholding_method", settings.threshold == Threshold::Sauvola ? "2" : "0");
     // Reading every poor line a second time inverted costs the fast level too much,

@@ -179,6 +179,16 @@ TEST_F(TesseractRecognition, RecognitionStopsWhenCancelledOrPastItsDeadline) {
   EXPECT_FALSE(outcome.results);
   EXPECT_LT(cancelled, whole / 2) << cancelled << " s against " << whole << " s";
   EXPECT_EQ(asked, 4);  // not asked again once it said stop
+  // Cancelled before the engine starts on the page (while it waited for a free engine):
+  // not read at all. The engine's own monitor is first asked only after its layout
+  // analysis, which cancelled pages of a busy queue used to run to the end.
+  double engineSeconds = detail::tesseractStatistics(*recognizer_).recognitionSeconds, early = 0;
+  outcome =
+      run([](TextRecognitionRequest& r) { r.setCancellationCheck([] { return true; }); }, &early);
+  ASSERT_TRUE(outcome.error);
+  EXPECT_EQ(outcome.error->code, TextRecognitionErrorCancelled);
+  EXPECT_LT(detail::tesseractStatistics(*recognizer_).recognitionSeconds - engineSeconds,
+            whole / 20);
   // A deadline already past when the first word is read.
   outcome = run([](TextRecognitionRequest& r) { r.setTimeout(1e-6); }, &late);
   ASSERT_TRUE(outcome.error);
