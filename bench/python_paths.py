@@ -46,9 +46,12 @@ with LocalCluster(n_workers=2, threads_per_worker=1, processes=True,
                   dashboard_address=None) as cluster, Client(cluster) as client:
     up = time.monotonic()
     with tempfile.TemporaryDirectory() as out:
-        report = ocr_many(paths, out, client, level=level)
+        # JSON, as `corvel ocr --json` writes it, so that the texts compare page by page.
+        report = ocr_many(paths, out, client, level=level, formats=["json"])
         done = time.monotonic()
-        texts = [(Path(out) / (Path(p).stem + ".txt")).read_text() for p in paths]
+        texts = ["\f".join(page["text"] for page in json.loads(
+                     (Path(out) / (Path(p).stem + ".json")).read_text())["files"][0]["pages"])
+                 for p in paths]
     peak = client.run(lambda: resource.getrusage(resource.RUSAGE_SELF).ru_maxrss)
 # The driver's own peak: the one the parent sees also counts the workers, its children.
 json.dump({"texts": texts, "startup": up - started, "ocr_many": done - up,
@@ -72,7 +75,8 @@ def run(command):
 def corvel_path(args, pages):
     command = [args.corvel, "ocr", "--json"] + (["--fast"] if args.level == "fast" else [])
     wall, peak, out = run(command + [str(p) for p in pages])
-    texts = [json.loads(line)["text"] for line in out.decode().splitlines()]
+    texts = ["\f".join(page["text"] for page in file["pages"])
+             for file in json.loads(out)["files"]]
     return {"wall": wall, "peak_kib": peak, "texts": texts}
 
 
