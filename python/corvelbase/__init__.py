@@ -37,7 +37,7 @@ __all__ = [
     "DocumentDamagedError", "DocumentEncryptedError", "PageRangeError", "WriteError",
     "UnsupportedLanguageError", "EngineError", "NoRecognizerError", "RecognitionTimeoutError",
     "RecognitionCancelledError", "UnsupportedSystemError", "Language", "languages", "is_valid_language_combination",
-    "supports_fast_recognition", "order_languages", "configure_engine", "engine_statistics",
+    "supports_fast_recognition", "order_languages", "configure_engine",
     "release_idle_engines", "analyse_layout", "dominant_language", "header_value",
     "contains_asian_characters", "markdown", "uti",
 ]
@@ -115,12 +115,6 @@ def configure_engine(*, concurrency: int = 0, data_path: str = "",
     """
     _native.configure_engine(data_path, concurrency, idle_model_bytes, fast_max_long_side,
                              timeout_per_megapixel, min_timeout)
-
-
-def engine_statistics() -> dict[str, float] | None:
-    """What the engine pool has done so far (recognitions, seconds inside the engine,
-    engines started, idle engines), or None when another recogniser is installed."""
-    return _native.engine_statistics()
 
 
 def release_idle_engines() -> None:

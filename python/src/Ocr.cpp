@@ -208,20 +208,6 @@ void bindOcr(py::module_& m) {
           py::gil_scoped_release release;
           PlatformRegistry::setTextRecognizer(TesseractRecognizer::init(options));
         });
-  m.def("engine_statistics", []() -> py::object {
-    auto engine = tesseract();
-    if (!engine) return py::none();
-    TesseractRecognizer::Statistics s = engine->statistics();
-    py::dict out;
-    out["recognitions"] = s.recognitions;
-    out["recognition_seconds"] = s.recognitionSeconds;
-    out["recognition_cpu_seconds"] = s.recognitionCpuSeconds;
-    out["engines_started"] = s.enginesStarted;
-    out["engine_start_seconds"] = s.engineStartSeconds;
-    out["engine_start_cpu_seconds"] = s.engineStartCpuSeconds;
-    out["idle_engines"] = s.idleEngines;
-    return out;
-  });
   m.def(
       "release_idle_engines",
       [] {
