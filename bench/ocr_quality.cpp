@@ -150,8 +150,7 @@ int main(int argc, char** argv) {
   }
   if (!fs::is_directory(hard) || fs::is_empty(hard)) {
     // Debian's interpreter, which has the python3-pil and python3-numpy the script needs.
-    std::string render = "/usr/bin/python3 " +
-                         (source / "bench/render_hard.py").string() + " " +
+    std::string render = "/usr/bin/python3 " + (source / "bench/render_hard.py").string() + " " +
                          hard.string() + " --count " + std::to_string(count);
     std::printf("rendering the hard pages: %s\n", render.c_str());
     std::fflush(stdout);
