@@ -77,6 +77,16 @@ std::string secondsText(double seconds) {
 
 }  // namespace
 
+void PassResult::add(RecognizedTextObservation line) {
+  std::string lineText = toUTF8(line.candidates[0].string);
+  auto lineCharacters = static_cast<double>(
+      std::count_if(lineText.begin(), lineText.end(), [](char c) { return c != ' '; }));
+  characters += lineCharacters;
+  weight += lineCharacters * line.candidates[0].confidence;
+  text += lineText + "\n";
+  observations.push_back(std::move(line));
+}
+
 Reading judge(const PassResult& result, const PagePlan& plan) {
   if (result.meanConfidence() < kUnreadableConfidence) return Reading::Unreadable;
   if (result.meanConfidence() < kPoorConfidence) return Reading::Doubtful;
@@ -366,15 +376,7 @@ bool PageReader::rereadWeakBlocks(const Page& page, const std::string& models,
   merged.insert(merged.end(), observations.begin() + static_cast<std::ptrdiff_t>(copied),
                 observations.end());
   PassResult rebuilt;
-  for (auto& line : merged) {
-    std::string text = toUTF8(line.candidates[0].string);
-    auto characters = static_cast<double>(
-        std::count_if(text.begin(), text.end(), [](char c) { return c != ' '; }));
-    rebuilt.characters += characters;
-    rebuilt.weight += characters * line.candidates[0].confidence;
-    rebuilt.text += text + "\n";
-    rebuilt.observations.push_back(std::move(line));
-  }
+  for (auto& line : merged) rebuilt.add(std::move(line));
   *result = std::move(rebuilt);
   return true;
 }
@@ -490,16 +492,10 @@ bool PageReader::readMissedRegions(const Page& page, const std::string& models,
         return w > 0 && hh > 0 && static_cast<double>(w) * hh > kMaxOverlap * l.w * l.h;
       });
       if (overlaps) continue;
-      std::string text = toUTF8(line.candidates[0].string);
-      auto characters = static_cast<double>(
-          std::count_if(text.begin(), text.end(), [](char ch) { return ch != ' '; }));
-      result->characters += characters;
-      result->weight += characters * line.candidates[0].confidence;
-      result->text += text + "\n";
       line.block = nextBlock;
       line.paragraph = nextParagraph;
       lines.push_back(l);
-      result->observations.push_back(std::move(line));
+      result->add(std::move(line));
       added = true;
     }
     if (added) ++nextBlock, ++nextParagraph;
@@ -600,15 +596,6 @@ void PageReader::collectLines(tesseract::TessBaseAPI& api, PIX* page, PassResult
     lines.push_back(std::move(observation));
   } while (it->PageIterator::Next(tesseract::RIL_TEXTLINE));
   dropGraphics(lines);
-  for (auto& observation : lines) {
-    const auto& [string, confidence] = observation.candidates.front();
-    std::string text = toUTF8(string);
-    auto characters = static_cast<double>(
-        std::count_if(text.begin(), text.end(), [](char c) { return c != ' '; }));
-    out->characters += characters;
-    out->weight += characters * confidence;
-    out->observations.push_back(std::move(observation));
-    out->text += text + "\n";
-  }
+  for (auto& line : lines) out->add(std::move(line));
 }
 }  // namespace corvel::detail

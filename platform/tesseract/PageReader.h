@@ -81,6 +81,8 @@ struct PassResult {
   double weight = 0;      // characters weighted by their line's confidence
 
   double meanConfidence() const { return characters > 0 ? weight / characters : 0; }
+  // Appends a line, counting its characters and confidence into the totals.
+  void add(RecognizedTextObservation line);
 };
 
 enum class Reading {
